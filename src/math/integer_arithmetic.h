@@ -1,0 +1,31 @@
+// Conversions and integer arithmetic that mean the same on every processor and are never undefined.
+#pragma once
+
+#include <cstdint>
+#include <limits>
+
+namespace n3ds {
+
+// Float to integer as 64-bit Arm converts: toward zero, saturating, 0 for not-a-number. Plain casts
+// of such values are undefined and differ between x86-64 and Arm.
+inline int32_t TruncateToInt32(double value) {
+  constexpr double kLowest = std::numeric_limits<int32_t>::min();
+  constexpr double kHighest = std::numeric_limits<int32_t>::max();
+  if (value >= kHighest) return std::numeric_limits<int32_t>::max();
+  if (value <= kLowest) return std::numeric_limits<int32_t>::min();
+  return value == value ? static_cast<int32_t>(value) : 0;
+}
+
+// 32-bit arithmetic that wraps.
+inline int32_t WrapAdd(int32_t a, int32_t b) {
+  return static_cast<int32_t>(static_cast<uint32_t>(a) + static_cast<uint32_t>(b));
+}
+inline int32_t WrapSubtract(int32_t a, int32_t b) {
+  return static_cast<int32_t>(static_cast<uint32_t>(a) - static_cast<uint32_t>(b));
+}
+inline int32_t WrapMultiply(int32_t a, int32_t b) {
+  return static_cast<int32_t>(static_cast<uint32_t>(a) * static_cast<uint32_t>(b));
+}
+inline int32_t WrapAbs(int32_t a) { return a < 0 ? WrapSubtract(0, a) : a; }
+
+}  // namespace n3ds
