@@ -1,0 +1,131 @@
+"""The flat half face on which the mesh is laid out, and its place in the texture.
+
+Flat coordinates are millimetres, x right and y up, the half at image left (x <= 0); texture
+coordinates run from 0 to 1 with v downwards.
+"""
+
+from dataclasses import dataclass
+
+import numpy as np
+from scipy.optimize import brentq
+from scipy.spatial import ConvexHull
+
+import sample_mesh
+
+U_MIDDLE = 0.499946
+U_LEFT, U_RIGHT = 0.016646, 0.983246
+V_TOP, V_BOTTOM = 0.002930, 0.997054
+# The texture keeps the middle of the face in true proportion and narrows the sides.
+MIDDLE_PROPORTION = 0.95
+
+# Texture places of the first three vertices; vertex 1 has exactly the neighbours 0, 2, 4 and 3.
+FIRST_TEXTURE = {0: (0.069524, 0.281949), 1: (0.081158, 0.319456), 2: (0.038178, 0.318155)}
+PATCH_FLAT = {3: (-102.5, 17.0), 4: (-110.0, 4.0)}
+
+BORDER_CENTRE_Y = -30.0
+BORDER_MARGIN = 2.5
+BORDER_EDGES = 50  # of the half face; with 24 round the eye and 12 along the mouth 86 of 172
+BORDER_TERMS = 12
+
+
+@dataclass
+class Layout:
+    """Maps flat places to texture coordinates: v by a straight line, u by an odd cubic."""
+
+    left: float
+    top: float
+    bottom: float
+
+    def __post_init__(self):
+        self.v_scale = (V_BOTTOM - V_TOP) / (self.top - self.bottom)
+        self.u_scale = MIDDLE_PROPORTION * self.v_scale
+        half = U_MIDDLE - U_LEFT
+        self.u_bend = (self.u_scale * -self.left - half) / (-self.left) ** 3
+
+    def u_of(self, x):
+        return U_MIDDLE + self.u_scale * x - self.u_bend * x**3
+
+    def texture(self, flat):
+        return np.column_stack([
+            self.u_of(flat[:, 0]), V_TOP + (self.top - flat[:, 1]) * self.v_scale])
+
+    def flat(self, u, v):
+        x = brentq(lambda t: self.u_of(t) - u, self.left, -self.left, xtol=1e-12)
+        return np.array([x, self.top - (v - V_TOP) / self.v_scale])
+
+
+@dataclass
+class Domain:
+    """What the mesh of the half face has to respect."""
+
+    layout: Layout
+    ids: np.ndarray  # measured points of the half
+    flat: np.ndarray  # their flat places
+    triangles: np.ndarray  # coarse triangles over them
+    border: np.ndarray  # dense polyline, from the top of the middle line to its bottom
+    eye: np.ndarray  # dense closed polyline through the lid rims
+    mouth: np.ndarray  # dense polyline from the middle of the upper rim to that of the lower
+    patch: dict  # flat places of the vertices 0 to 4
+
+    def place(self, point):
+        return self.flat[np.flatnonzero(self.ids == point)[0]]
+
+
+def _catmull_rom(points, closed, steps=24):
+    """Dense centripetal curve through the points; the points themselves are every steps-th."""
+    n = len(points)
+    if closed:
+        padded = np.concatenate([points[-1:], points, points[:2]])
+    else:
+        padded = np.concatenate([2 * points[:1] - points[1:2], points,
+                                 2 * points[-1:] - points[-2:-1]])
+    out = []
+    for k in range(n if closed else n - 1):
+        p = padded[k:k + 4]
+        lengths = np.linalg.norm(np.diff(p, axis=0), axis=1)
+        knots = np.concatenate([[0.0], np.cumsum(np.sqrt(lengths))])
+        for s in range(steps):
+            t = knots[1] + (knots[2] - knots[1]) * s / steps
+            mix = lambda a, b, low, high: ((high - t) * a + (t - low) * b) / (high - low)
+            first = [mix(p[i], p[i + 1], knots[i], knots[i + 1]) for i in range(3)]
+            second = [mix(first[i], first[i + 1], knots[i], knots[i + 2]) for i in range(2)]
+            out.append(mix(second[0], second[1], knots[1], knots[2]))
+    if not closed:
+        out.append(points[-1])
+    return np.array(out)
+
+
+def _border(flat):
+    """A smooth outline round the measured points, in polar form about the middle line."""
+    both = np.concatenate([flat, flat * [-1, 1]])
+    outer = ConvexHull(both).vertices
+    outer = np.sort(outer[outer < len(flat)])
+    offset = flat[outer] - [0.0, BORDER_CENTRE_Y]
+    radius = np.linalg.norm(offset, axis=1)
+    angle = np.arctan2(-offset[:, 0], offset[:, 1])  # 0 up, growing to image left
+    basis = np.cos(np.outer(angle, np.arange(BORDER_TERMS)))
+    ridge = np.diag(0.002 * np.arange(BORDER_TERMS) ** 3)
+    fitted = np.linalg.lstsq(
+        np.vstack([basis, ridge]),
+        np.concatenate([radius + BORDER_MARGIN, np.zeros(BORDER_TERMS)]), rcond=None)[0]
+    turn = np.linspace(0, np.pi, 721)
+    r = np.cos(np.outer(turn, np.arange(BORDER_TERMS))) @ fitted
+    line = [0.0, BORDER_CENTRE_Y] + np.column_stack([-r * np.sin(turn), r * np.cos(turn)])
+    line[[0, -1], 0] = 0.0
+    return line, np.min(basis @ fitted - radius)
+
+
+def build(data):
+    ids, flat, triangles = sample_mesh.build(data)
+    flat = np.round(flat, 4)  # later steps do not depend on the last bits of the solver
+    border, clearance = _border(flat)
+    if clearance < 0.5:
+        raise ValueError(f"the border comes within {clearance:.2f} mm of a measured point")
+    border = np.round(border, 4)
+    layout = Layout(border[:, 0].min(), border[:, 1].max(), border[:, 1].min())
+    where = {int(p): k for k, p in enumerate(ids)}
+    eye = _catmull_rom(flat[[where[p] for p in sample_mesh.EYE_RING]], closed=True)
+    mouth = _catmull_rom(flat[[where[p] for p in sample_mesh.MOUTH_RING]], closed=False)
+    patch = {k: layout.flat(*uv) for k, uv in FIRST_TEXTURE.items()}
+    patch.update({k: np.array(v) for k, v in PATCH_FLAT.items()})
+    return Domain(layout, ids, flat, triangles, border, eye, mouth, patch)

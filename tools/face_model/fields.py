@@ -1,0 +1,113 @@
+"""Smooth fields over a triangle mesh through values given at places on it.
+
+The smoothness is the integral of squared second derivatives, in the hinge form of Bergou et al.,
+"A quadratic bending model for inextensible surfaces" (2006): each inner edge counts the kink of the
+field over its two triangles, unfolded flat. Straight-line fields cost nothing, also at the borders,
+so lids and lips end freely and do not feel each other across the open eye or mouth.
+"""
+
+from dataclasses import dataclass
+
+import numpy as np
+import scipy.sparse as sp
+from scipy.sparse.linalg import splu
+from scipy.spatial import cKDTree
+
+from triangulate import edge_owners
+
+
+def subdivided(places, triangles):
+    """Each triangle cut in four; the given vertices keep their numbers."""
+    edges = np.unique(np.sort(np.concatenate(
+        [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
+    number = {tuple(e): len(places) + k for k, e in enumerate(edges.tolist())}
+    middle = 0.5 * (places[edges[:, 0]] + places[edges[:, 1]])
+    out = []
+    for a, b, c in triangles.tolist():
+        ab, bc, ca = (number[min(e), max(e)] for e in ((a, b), (b, c), (c, a)))
+        out += [(a, ab, ca), (ab, b, bc), (ca, bc, c), (ab, bc, ca)]
+    return np.concatenate([places, middle]), np.array(out)
+
+
+def subdivision_matrix(count, triangles):
+    """The linear map from vertex values to those of the mesh cut in four."""
+    eye, _ = subdivided(np.eye(count)[:, :0], triangles)
+    edges = np.unique(np.sort(np.concatenate(
+        [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
+    rows = np.repeat(np.arange(len(edges)), 2)
+    half = sp.csr_matrix((np.full(2 * len(edges), 0.5), (rows, edges.ravel())), (len(edges), count))
+    return sp.vstack([sp.eye(count), half]).tocsr()
+
+
+def _cot(points, at, one, two):
+    a, b = points[one] - points[at], points[two] - points[at]
+    if points.shape[1] == 2:
+        cross = np.abs(a[:, 0] * b[:, 1] - a[:, 1] * b[:, 0])
+    else:
+        cross = np.linalg.norm(np.cross(a, b), axis=1)
+    return np.einsum("ij,ij->i", a, b) / np.maximum(cross, 1e-9), 0.5 * cross
+
+
+def bending(points, triangles):
+    """The sparse form Q with f' Q f the bending of the field f; lengths are those of `points`."""
+    hinges = []
+    for edge, faces in sorted(edge_owners(triangles).items()):
+        if len(faces) == 2:
+            apex = [next(v for v in triangles[f].tolist() if v not in edge) for f in faces]
+            hinges.append((*edge, *apex))
+    h = np.array(hinges)
+    a, b, c, d = h.T
+    c01, area_0 = _cot(points, a, b, c)
+    c02, area_1 = _cot(points, a, b, d)
+    c03, _ = _cot(points, b, a, c)
+    c04, _ = _cot(points, b, a, d)
+    k = np.stack([c03 + c04, c01 + c02, -c01 - c03, -c02 - c04], axis=1)
+    k *= np.sqrt(3.0 / np.maximum(area_0 + area_1, 1e-6))[:, None]
+    rows = np.repeat(np.arange(len(h)), 4)
+    kink = sp.csr_matrix((k.ravel(), (rows, h.ravel())), (len(h), len(points)))
+    return (kink.T @ kink).tocsc()
+
+
+@dataclass
+class Anchors:
+    """Places on a mesh: triangle and weights of its corners."""
+
+    triangle: np.ndarray
+    weights: np.ndarray
+
+    def matrix(self, triangles, count):
+        rows = np.repeat(np.arange(len(self.triangle)), 3)
+        return sp.csr_matrix((self.weights.ravel(), (rows, triangles[self.triangle].ravel())),
+                             (len(self.triangle), count))
+
+
+def locate(flat, triangles, places):
+    """The triangle of each place, or the nearest one for places a little outside."""
+    a, b, c = (flat[triangles[:, k]] for k in range(3))
+    det = (b - a)[:, 0] * (c - a)[:, 1] - (b - a)[:, 1] * (c - a)[:, 0]
+    near = np.sort(cKDTree((a + b + c) / 3.0).query(places, k=min(40, len(triangles)))[1], axis=1)
+    ap, ab, ac = places[:, None] - a[near], (b - a)[near], (c - a)[near]
+    w1 = (ap[..., 0] * ac[..., 1] - ap[..., 1] * ac[..., 0]) / det[near]
+    w2 = (ab[..., 0] * ap[..., 1] - ab[..., 1] * ap[..., 0]) / det[near]
+    w = np.stack([1.0 - w1 - w2, w1, w2], axis=-1)
+    best = np.argmax(np.round(w.min(axis=2), 9), axis=1)
+    rows = np.arange(len(places))
+    return Anchors(near[rows, best], w[rows, best])
+
+
+def through_values(quadratic, matrix, values, weight):
+    """Fields (count, k) that bend least while `matrix @ field` stays at `values` (n, k)."""
+    system = (quadratic + weight * (matrix.T @ matrix)).tocsc()
+    return splu(system).solve(np.asarray(weight * (matrix.T @ values)))
+
+
+def surface_through(quadratic, matrix, points, weight, slopes, slope_weight):
+    """Vertex positions (count, 3) through `points`; `slopes` (m, 3 count) @ x should vanish.
+
+    The unknowns of `slopes` are ordered x of all vertices, then y, then z.
+    """
+    count = quadratic.shape[0]
+    one = quadratic + weight * (matrix.T @ matrix)
+    system = sp.block_diag([one] * 3) + slope_weight * (slopes.T @ slopes)
+    right = np.concatenate([weight * (matrix.T @ points[:, k]) for k in range(3)])
+    return splu(system.tocsc()).solve(right).reshape(3, count).T

@@ -1,0 +1,96 @@
+"""Spreads a triangulated surface out flat with little distortion and without folds.
+
+Minimises the symmetric Dirichlet energy (Smith and Schaefer, "Bijective parameterization with free
+boundaries", 2015) by reweighted local/global steps (Rabinovich et al., "Scalable locally injective
+mappings", 2017).
+"""
+
+import numpy as np
+import scipy.sparse as sp
+from scipy.sparse.linalg import splu
+
+
+def gradients(corners):
+    """Per triangle (n, 3 corners, 3) the area and the gradients (2 x 3) in its own plane."""
+    a, b, c = (corners[:, k] for k in range(3))
+    e, f = b - a, c - a
+    length = np.linalg.norm(e, axis=1)
+    x = np.einsum("ij,ij->i", e, f) / length
+    y = np.linalg.norm(np.cross(e, f), axis=1) / length
+    area = 0.5 * length * y
+    grad = np.zeros((len(corners), 2, 3))
+    grad[:, 0, 0], grad[:, 0, 1] = -1.0 / length, 1.0 / length
+    grad[:, 1, 0] = (x / length - 1.0) / y
+    grad[:, 1, 1] = -x / length / y
+    grad[:, 1, 2] = 1.0 / y
+    return area, grad
+
+
+def jacobians(plane, triangles, grad):
+    return np.einsum("tkd,tgk->tdg", plane[triangles], grad)
+
+
+def energy(jac, area):
+    det = np.linalg.det(jac)
+    if (det <= 0).any():
+        return np.inf
+    norm = np.einsum("tij,tij->t", jac, jac)
+    return float((area * norm * (1.0 + 1.0 / det**2)).sum())
+
+
+def symmetric_dirichlet(corners, plane, triangles, on_axis, rounds=80):
+    """Flat places of the vertices, starting from `plane`, which must not be folded.
+
+    `corners` (n, 3, 3) are the corner positions of each triangle in space, whose shape the flat
+    triangle is to keep. Vertices listed in `on_axis` stay on the line x = 0.
+    """
+    count = len(plane)
+    area, grad = gradients(corners)
+    plane = plane.copy()
+    pinned = np.zeros(2 * count, bool)
+    pinned[on_axis] = True  # x of the axis vertices
+    free = np.flatnonzero(~pinned)
+    best = energy(jacobians(plane, triangles, grad), area)
+    if not np.isfinite(best):
+        raise ValueError("the starting layout has folded triangles")
+    rows = np.repeat(np.arange(len(triangles)), 3)
+    d = [sp.csr_matrix((grad[:, g].ravel(), (rows, triangles.ravel())), (len(triangles), count))
+         for g in range(2)]
+    for _ in range(rounds):
+        jac = jacobians(plane, triangles, grad)
+        u, s, vt = np.linalg.svd(jac)
+        sign = np.sign(np.linalg.det(u @ vt))
+        u[:, :, 1] *= sign[:, None]
+        s = np.maximum(s, 1e-9)
+        near = np.abs(s - 1.0) < 1e-5
+        weight = np.sqrt(np.where(near, 4.0, (s - s**-3) / np.where(near, 1.0, s - 1.0)))
+        w = np.einsum("tij,tj,tkj->tik", u, weight, u)
+        rotation = u @ vt
+        target = w @ rotation
+        root = np.sqrt(area)
+        # unknown order: all x, then all y
+        a = sp.vstack([
+            sp.hstack([sp.diags(root * w[:, i, 0]) @ d[g], sp.diags(root * w[:, i, 1]) @ d[g]])
+            for i in range(2) for g in range(2)]).tocsc()
+        rhs = np.concatenate([root * target[:, i, g] for i in range(2) for g in range(2)])
+        now = np.concatenate([plane[:, 0], plane[:, 1]])
+        normal = (a.T @ a + 1e-6 * sp.eye(2 * count)).tocsc()
+        right = a.T @ rhs + 1e-6 * now
+        solution = now.copy()
+        solution[free] = splu(normal[free][:, free]).solve(
+            right[free] - normal[free][:, np.flatnonzero(pinned)] @ now[pinned])
+        step = solution.reshape(2, count).T - plane
+        length = 1.0
+        while length > 1e-6:
+            trial = plane + length * step
+            value = energy(jacobians(trial, triangles, grad), area)
+            if value < best:
+                break
+            length *= 0.6
+        else:
+            break
+        gain = best - value
+        plane, best = trial, value
+        if gain < 1e-7 * best:
+            break
+    return plane

@@ -1,0 +1,67 @@
+#!/usr/bin/env python3
+"""Rebuilds the face model in data/ from the measured figures: python3 tools/face_model/generate.py
+
+The result is the same, bit for bit, in every run. See docs/face-model.md.
+"""
+
+import argparse
+from pathlib import Path
+
+import numpy as np
+
+import candidates
+import domain
+import fields
+import measurements
+import numbering
+import surface
+import tables
+import topology
+import writer
+
+IDENTITY_UNIT = 4.0  # standard deviations that one unit of an identity coefficient stands for
+
+
+def build():
+    data = measurements.load()
+    dom = domain.build(data)
+    half = topology.half_mesh(dom)
+    mesh = topology.mirrored(half.flat, half.triangles, half.middle)
+    lifted = surface.lift(data, dom, mesh)
+    mean, identity, expression = surface.modes(data, mesh, lifted)
+    mean, identity, expression = (np.round(a, 5) for a in (mean, identity, expression))
+
+    cut = fields.subdivision_matrix(len(mean), mesh.triangles)
+    fine_identity = np.array([cut @ m for m in identity])
+    count = candidates.usage(mean, identity, lifted.points, fine_identity, lifted.triangles)
+    owners = numbering.edge_owners(mesh.triangles)
+    known = numbering.known_vertices(data, half, mesh, owners)
+    table = set(tables.contour_candidates().tolist())
+    must = [v for n, v in known.items() if n in table]
+    never = [v for n, v in known.items() if n not in table]
+    chosen = candidates.choose(count, mesh.mirror, must, never, len(table))
+    order, triangles = numbering.number(data, half, mesh, mean, chosen)
+
+    texture = dom.layout.texture(mesh.flat)[order]
+    for number, pair in domain.FIRST_TEXTURE.items():
+        texture[number] = pair
+    tensor = np.zeros((len(identity), len(expression), len(mean), 3), np.int8)
+    return dict(mean=mean[order], identity=identity[:, order], expression=expression[:, order],
+                tensor=tensor, triangles=triangles, texture=texture)
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--out", type=Path, default=measurements.DATA, help="folder to write to")
+    out = parser.parse_args().out
+    model = build()
+    out.mkdir(parents=True, exist_ok=True)
+    writer.write_model(out / "face_model.bin", writer.tilted(model["mean"]),
+                       IDENTITY_UNIT * writer.tilted(model["identity"]),
+                       writer.tilted(model["expression"]), model["tensor"])
+    writer.write_triangles(out / "triangles.inc", model["triangles"])
+    writer.write_texture(out / "texture_coordinates.inc", model["texture"])
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,281 @@
+"""Lays out the vertices and triangles of the half face and mirrors them to the whole mesh.
+
+The counts are fixed: 1812 vertices and 3456 triangles with the two eyes and the mouth open leave
+172 edges on the boundary, 86 a half.
+"""
+
+from dataclasses import dataclass
+
+import numpy as np
+from scipy.spatial import Delaunay, cKDTree
+
+import domain as domain_module
+from triangulate import flip_by_shape, signed_areas, with_edges
+
+VERTICES, TRIANGLES, BOUNDARY_EDGES = 1812, 3456, 172
+MIDDLE_VERTICES = 64  # on the middle line; even, like the number of vertices
+SEED = 1812
+
+# Wanted edge length (mm): (name of the feature, at the feature, growth a millimetre of distance)
+GROWTH = {"eye": (2.7, 0.135), "lips": (2.8, 0.11), "nose": (2.8, 0.12), "brow": (4.6, 0.10)}
+SIDE_LENGTH = 5.4  # cheeks and jaw, where the outline of a turned head runs
+FOREHEAD_LENGTH = 9.5
+LIP_LINE = [75, 76, 77, 78, 84, 85, 86]
+NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 297, 285, 275, 276, 303, 307, 311, 314, 308,
+               295, 299, 309, 289, 292]
+BROW_POINTS = list(range(19, 29))
+LID_RING = 24  # vertices round the eye; they come first
+INNER_POINTS = list(range(0, 9)) + list(range(19, 29)) + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86]
+WALL_DISTANCE = 0.6  # of the wanted edge length, between free vertices and edges that stay
+
+
+@dataclass
+class HalfMesh:
+    """Vertices of the half face; `named` gives the vertex of each measured point that is one."""
+
+    flat: np.ndarray
+    triangles: np.ndarray
+    middle: np.ndarray  # vertices on the middle line
+    fixed: np.ndarray  # vertices that keep their place
+    named: dict  # measured point -> vertex
+    patch: dict  # 0..4 -> vertex
+    lid_middle: int  # the vertex above the pupil on the upper lid's rim
+    border: list  # vertices along the outer border, top to bottom
+    keep: frozenset  # edges that stay
+
+
+def _spaced(line, count, weight=None):
+    """`count` + 1 places along a polyline, both ends included, denser where weight is small."""
+    step = np.linalg.norm(np.diff(line, axis=0), axis=1)
+    if weight is not None:
+        step = step / weight[:-1]
+    along = np.concatenate([[0.0], np.cumsum(step)])
+    wanted = np.linspace(0, along[-1], count + 1)
+    return np.column_stack([np.interp(wanted, along, line[:, k]) for k in range(2)])
+
+
+class Sizing:
+    """Wanted edge length at a flat place."""
+
+    def __init__(self, dom):
+        point = lambda ids: np.array([dom.place(p) for p in ids])
+        self.trees = {
+            "eye": cKDTree(dom.eye),
+            "lips": cKDTree(np.concatenate([dom.mouth, point(LIP_LINE)])),
+            "nose": cKDTree(point(NOSE_POINTS)),
+            "brow": cKDTree(point(BROW_POINTS)),
+        }
+        self.patch = cKDTree(np.array([dom.patch[k] for k in range(5)]))
+
+    def __call__(self, places):
+        size = np.full(len(places), np.inf)
+        for name, (start, growth) in GROWTH.items():
+            size = np.minimum(size, start + growth * self.trees[name].query(places)[0])
+        # the forehead is coarse, cheeks and jaw finer
+        up = np.clip((places[:, 1] - 22.0) / 25.0, 0.0, 1.0)
+        size = np.minimum(size, SIDE_LENGTH + (FOREHEAD_LENGTH - SIDE_LENGTH) * up)
+        near = self.patch.query(places)[0]
+        return np.maximum(size, 9.5 - 0.35 * near)
+
+
+def _inside(polygon, places):
+    """Even-odd test of many places against a closed polygon."""
+    x, y = places[:, 0], places[:, 1]
+    inside = np.zeros(len(places), bool)
+    for (ax, ay), (bx, by) in zip(polygon, np.roll(polygon, -1, axis=0)):
+        if ay == by:
+            continue
+        crosses = (ay > y) != (by > y)
+        inside ^= crosses & (x < (bx - ax) * (y - ay) / (by - ay) + ax)
+    return inside
+
+
+def _boundary(dom, sizing):
+    """Fixed places and the edges that join them, as (places, edges, bookkeeping)."""
+    places, edges, named = [], [], {}
+
+    def add(place, point=None):
+        if point is not None:
+            named[point] = len(places)
+        places.append(place)
+        return len(places) - 1
+
+    def join(chain):
+        edges.extend(zip(chain, chain[1:]))
+
+    # lid ring: the twelve landmarks and one vertex between each two
+    eye_ring = domain_module.sample_mesh.EYE_RING
+    chain = []
+    for k, point in enumerate(eye_ring):
+        chain.append(add(dom.place(point), point))
+        chain.append(add(dom.eye[24 * k + 12]))
+    join(chain + chain[:1])
+    lid_middle = chain[2 * eye_ring.index(42) + 1]
+
+    # mouth rim: the measured points, and one between where they are far apart
+    ring = domain_module.sample_mesh.MOUTH_RING
+    between = {(88, 364), (364, 87), (87, 365)}
+    mouth = []
+    for k, point in enumerate(ring):
+        mouth.append(add(dom.place(point), point))
+        if k + 1 < len(ring) and (point, ring[k + 1]) in between:
+            mouth.append(add(dom.mouth[24 * k + 12]))
+    join(mouth)
+
+    # outer border
+    line = dom.border
+    outer = [add(p) for p in _spaced(line, domain_module.BORDER_EDGES, sizing(line) ** 0.5)]
+    left = outer[int(np.argmin(np.array(places)[outer][:, 0]))]
+    places[left] = line[np.argmin(line[:, 0])]
+    join(outer)
+
+    # middle line, two stretches: border to upper lip, lower lip to border
+    stops = [[outer[0]] + [97, 98, 99, 100, 78, 89], [93, 84, 9] + [outer[-1]]]
+    spans = []
+    for stretch in stops:
+        marks = [places[s] if k in (outer[0], outer[-1]) and s in (outer[0], outer[-1])
+                 else dom.place(s) for k, s in ((s, s) for s in stretch)]
+        spans.append(np.array(marks))
+    middle_counts = _middle_counts(spans, sizing)
+    middle = []
+    for stretch, marks, counts in zip(stops, spans, middle_counts):
+        chain = []
+        for k, stop in enumerate(stretch):
+            if stop in (outer[0], outer[-1]) and (k == 0 or k == len(stretch) - 1) \
+                    and stop not in (89, 93):
+                chain.append(stop)
+            elif stop in named:
+                chain.append(named[stop])
+            else:
+                chain.append(add(marks[k], stop))
+            if k + 1 < len(stretch):
+                dense = np.linspace(marks[k], marks[k + 1], 200)
+                for p in _spaced(dense, counts[k], sizing(dense))[1:-1]:
+                    chain.append(add(p))
+        join(chain)
+        middle += chain
+    return places, edges, named, lid_middle, mouth, outer, middle
+
+
+def _middle_counts(spans, sizing):
+    """Edges between neighbouring stops so that the middle line has its number of vertices."""
+    want = []
+    for marks in spans:
+        for a, b in zip(marks, marks[1:]):
+            dense = np.linspace(a, b, 200)
+            step = np.linalg.norm(b - a) / 199
+            want.append((step / sizing(dense)).sum())
+    want = np.array(want)
+    total = MIDDLE_VERTICES - len(spans)  # edges on the middle line
+    counts = np.maximum(1, np.floor(want * total / want.sum())).astype(int)
+    while counts.sum() < total:
+        counts[np.argmax(want * total / want.sum() / counts)] += 1
+    split = len(spans[0]) - 1
+    return counts[:split].tolist(), counts[split:].tolist()
+
+
+def _relax(places, count_fixed, sizing, inside, wall, rounds=400):
+    """Spreads the free places by springs that push apart (Persson and Strang's scheme).
+
+    Free places keep a distance from the edges that must stay (`wall`, dense places along them).
+    """
+    tree = cKDTree(wall)
+    for step in range(rounds):
+        triangles = Delaunay(places).simplices
+        centre = places[triangles].mean(axis=1)
+        triangles = triangles[inside(centre)]
+        edges = np.unique(np.sort(np.concatenate(
+            [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
+        vector = places[edges[:, 0]] - places[edges[:, 1]]
+        length = np.linalg.norm(vector, axis=1)
+        wanted = sizing(0.5 * (places[edges[:, 0]] + places[edges[:, 1]]))
+        wanted = wanted * 1.17 * np.sqrt((length**2).sum() / (wanted**2).sum())
+        force = np.maximum(wanted - length, 0.0) / length
+        push = vector * force[:, None]
+        total = np.zeros_like(places)
+        np.add.at(total, edges[:, 0], push)
+        np.add.at(total, edges[:, 1], -push)
+        pace = 0.2 if step < rounds * 0.8 else 0.1
+        moved = places + pace * total
+        distance, nearest = tree.query(moved)
+        least = WALL_DISTANCE * sizing(moved)
+        away = moved - wall[nearest]
+        close = distance < least
+        scale = least / np.maximum(distance, 1e-9)
+        moved[close] = wall[nearest][close] + away[close] * scale[close, None]
+        ok = inside(moved)
+        ok[:count_fixed] = False
+        places = np.where(ok[:, None], moved, places)
+    return places
+
+
+def half_mesh(dom):
+    sizing = Sizing(dom)
+    places, edges, named, lid_middle, mouth, outer, middle = _boundary(dom, sizing)
+    patch = {}
+    for k in range(5):
+        patch[k] = len(places)
+        places.append(dom.patch[k])
+    quad = [patch[k] for k in (0, 2, 4, 3)]
+    edges += list(zip(quad, quad[1:] + quad[:1]))
+    for point in INNER_POINTS:
+        if point not in named:
+            named[point] = len(places)
+            places.append(dom.place(point))
+    fixed = np.array(places)
+    fixed[middle, 0] = 0.0
+
+    # the mouth is open towards the middle line: close its outline beyond it
+    lips = np.concatenate([fixed[mouth], [[1.0, fixed[mouth[-1], 1]], [1.0, fixed[mouth[0], 1]]]])
+    holes = [fixed[:LID_RING], lips, fixed[quad]]
+    outline = fixed[outer]
+
+    def inside(p):
+        ok = _inside(outline, p) & (p[:, 0] < -1e-9)
+        for hole in holes:
+            ok &= ~_inside(hole, p)
+        return ok
+
+    wall = np.concatenate([
+        fixed[a] + (fixed[b] - fixed[a]) * np.linspace(0, 1, 24)[:, None] for a, b in edges])
+    half = (VERTICES - MIDDLE_VERTICES) // 2 + MIDDLE_VERTICES
+    free = half - len(fixed)
+    rng = np.random.RandomState(SEED)
+    low, high = outline.min(axis=0), outline.max(axis=0)
+    trial = low + (high - low) * rng.random_sample((60000, 2))
+    size = sizing(trial)
+    trial = trial[inside(trial) & (rng.random_sample(len(trial)) < (size.min() / size) ** 2)]
+    trial = trial[cKDTree(np.concatenate([fixed, wall])).query(trial)[0] > 0.5 * sizing(trial)]
+    if len(trial) < free:
+        raise ValueError("too few starting places")
+    places = np.concatenate([fixed, trial[:free]])
+    places = np.round(_relax(places, len(fixed), sizing, inside, wall), 5)
+
+    triangles = with_edges(places, edges)
+    triangles = triangles[inside(places[triangles].mean(axis=1))]
+    fan = [(patch[0], patch[2], patch[1]), (patch[1], patch[3], patch[0]),
+           (patch[4], patch[3], patch[1]), (patch[4], patch[1], patch[2])]
+    triangles = np.concatenate([triangles, fan])
+    spokes = [(patch[1], patch[k]) for k in (0, 2, 3, 4)]
+    stay = frozenset((min(e), max(e)) for e in edges + spokes)
+    return HalfMesh(places, triangles, np.array(sorted(middle)), np.arange(len(fixed)), named,
+                    patch, lid_middle, outer, stay)
+
+
+@dataclass
+class Mesh:
+    """The whole face; vertices of the half come first, then the mirror images of the others."""
+
+    flat: np.ndarray
+    triangles: np.ndarray
+    mirror: np.ndarray  # mirrored vertex of each vertex
+
+
+def mirrored(flat, triangles, middle):
+    count = len(flat)
+    side = np.setdiff1d(np.arange(count), middle)
+    image = np.arange(count)
+    image[side] = count + np.arange(len(side))
+    mirror = np.concatenate([image, side])
+    whole = np.concatenate([flat, flat[side] * [-1.0, 1.0]])
+    return Mesh(whole, np.concatenate([triangles, image[triangles][:, ::-1]]), mirror)
