@@ -1,0 +1,52 @@
+// Life of a core context: creation, face model, release.
+#include <cassert>
+#include <cstring>
+
+#include "core/face_model.h"
+#include "core/tracking_context.h"
+#include "norvale_3d_sticker_core.h"
+
+namespace {
+
+using n3ds::ContextOf;
+using n3ds::TrackingContext;
+
+// A host that cannot give the core its context has no engine to fall back on, so this stops the
+// process through the system's assertion handler, in release builds too. Name and place are fixed:
+// crash reports are grouped by them.
+[[noreturn]] void FailAllocation() {
+  constexpr const char* kFunction = "MRESULT N3DS_Init(MHandle, void**)";
+  constexpr const char* kFile = "norvale_3d_shape";
+  constexpr int kLine = 3221;
+#ifdef __ANDROID__
+  __assert2(kFile, kLine, kFunction, "context != nullptr");
+#else
+  __assert_fail("context != nullptr", kFile, kLine, kFunction);
+#endif
+}
+
+}  // namespace
+
+MRESULT N3DS_Init(MHandle memory, void** core) {
+  if (core == nullptr) return N3DS_NULL_ARGUMENT;
+  auto* context = static_cast<TrackingContext*>(MMemAlloc(memory, sizeof(TrackingContext)));
+  if (context == nullptr) FailAllocation();
+  std::memset(context, 0, sizeof(*context));
+  context->memory = memory;
+  *core = context;
+  return N3DS_OK;
+}
+
+MRESULT N3DS_LoadFaceHouse(void* core, const void* data, size_t size) {
+  if (core == nullptr || data == nullptr) return N3DS_NULL_ARGUMENT;
+  return n3ds::LoadFaceModel(static_cast<const uint8_t*>(data), size, ContextOf(core));
+}
+
+MRESULT N3DS_UnInit(void* core) {
+  if (core == nullptr) return N3DS_OK;
+  TrackingContext* context = ContextOf(core);
+  n3ds::ReleaseFaceModel(context);
+  MMemFree(context->memory, context->landmarkHistory);
+  MMemFree(context->memory, context);
+  return N3DS_OK;
+}
