@@ -1,0 +1,126 @@
+#include "core/pose_weights.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "math/integer_arithmetic.h"
+#include "norvale_3d_sticker_core.h"
+
+namespace n3ds {
+
+namespace {
+
+constexpr double kSmallestDivisor = 1e-6;
+constexpr double kMouthOpenRatio = 0.1;  // lip gap over mouth width
+
+struct Point {
+  int32_t x;
+  int32_t y;
+};
+
+Point Midpoint(const Point& a, const Point& b) {
+  return {WrapAdd(a.x, b.x) / 2, WrapAdd(a.y, b.y) / 2};
+}
+
+double Distance(const Point& a, const Point& b) {
+  const double dx = WrapSubtract(a.x, b.x);
+  const double dy = WrapSubtract(a.y, b.y);
+  return std::sqrt(dx * dx + dy * dy);
+}
+
+struct Normal {
+  double x;
+  double y;
+};
+
+// Normal of the line through two points, not of unit length.
+Normal LineNormal(const Point& a, const Point& b) {
+  const int32_t dx = WrapSubtract(a.x, b.x);
+  const int32_t dy = WrapSubtract(a.y, b.y);
+  if (dx == 0) return {1.0, 0.0};
+  if (dy == 0) return {0.0, 1.0};
+  return {static_cast<double>(dy) / dx, -1.0};
+}
+
+double AngleInDegrees(const Normal& a, const Normal& b) {
+  const double dot = std::fabs(a.x * b.x + a.y * b.y);
+  const double lengths = std::sqrt((a.x * a.x + a.y * a.y) * (b.x * b.x + b.y * b.y));
+  const auto cosine = static_cast<float>(dot / lengths);
+  return std::acos(static_cast<double>(cosine)) * 180.0 / 3.14159;
+}
+
+// Whether the larger of two distances exceeds `limit` times the smaller; nothing when the smaller
+// is too small to divide by.
+enum class Comparison { kWithin, kBeyond, kUndefined };
+Comparison CompareRatio(double a, double b, double limit) {
+  const double smaller = std::min(a, b);
+  if (smaller < kSmallestDivisor) return Comparison::kUndefined;
+  return std::max(a, b) / smaller > limit ? Comparison::kBeyond : Comparison::kWithin;
+}
+
+}  // namespace
+
+int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights) {
+  if (landmarks == nullptr) return N3DS_NULL_ARGUMENT;
+  const auto point = [landmarks](int k) { return Point{landmarks[2 * k], landmarks[2 * k + 1]}; };
+
+  const auto mouth_width = static_cast<double>(static_cast<float>(Distance(point(75), point(81))));
+  if (mouth_width < kSmallestDivisor) return N3DS_OK;
+  const double mouth_ratio = Distance(point(89), point(93)) / mouth_width;
+  if (mouth_ratio > kMouthOpenRatio) weights->mouth_open = 1;
+
+  const Point nose = Midpoint(point(66), point(71));
+  const double left = Distance(point(2), nose);
+  const double right = Distance(point(16), nose);
+  if (std::max(left, right) < kSmallestDivisor) return N3DS_OK;
+  const double symmetry = std::min(left, right) / std::max(left, right);
+
+  weights->contour = 1.0f;
+  if (mouth_ratio < kMouthOpenRatio) {
+    weights->range = 1.0f;
+  } else if (mouth_ratio <= 1.0) {
+    weights->range = static_cast<float>(1.1 - mouth_ratio);
+  } else {
+    weights->range = 0.1f;
+  }
+  if (right < kSmallestDivisor) return N3DS_OK;
+  weights->inner = static_cast<float>(left / right);
+
+  const Point eyes = Midpoint(point(45), point(51));
+  const Point nose_base = Midpoint(point(68), point(69));
+  const double chin_distance = Distance(point(9), nose_base);
+  if (chin_distance < kSmallestDivisor) return N3DS_OK;
+  const double pitch_ratio = Distance(eyes, nose_base) / chin_distance;
+  if (pitch_ratio > 0.5 && symmetry > 0.75 && pitch_ratio < 0.9) weights->frontal = 1;
+
+  // The inner weights and the identity fit are for an even, upright view: anything else clears the
+  // switch.
+  const auto clear_if = [weights](Comparison comparison) {
+    if (comparison == Comparison::kBeyond) weights->weighting_switch = 0;
+    return comparison != Comparison::kUndefined;
+  };
+  if (!clear_if(CompareRatio(Distance(point(9), point(75)), Distance(point(9), point(81)), 1.15))) {
+    return N3DS_OK;
+  }
+  const Point mouth = Midpoint(point(75), point(81));
+  const double mouth_to_nose = Distance(mouth, nose_base);
+  if (mouth_to_nose < kSmallestDivisor) return N3DS_OK;
+  if (Distance(mouth, point(9)) / mouth_to_nose > 2.3) weights->weighting_switch = 0;
+  if (!clear_if(
+          CompareRatio(Distance(nose_base, point(39)), Distance(nose_base, point(57)), 1.15))) {
+    return N3DS_OK;
+  }
+  const Point left_eye = Midpoint(point(42), point(48));
+  const Point right_eye = Midpoint(point(54), point(60));
+  if (AngleInDegrees(LineNormal(left_eye, right_eye), LineNormal(mouth, nose_base)) < 75.0) {
+    weights->weighting_switch = 0;
+  }
+  return N3DS_OK;
+}
+
+float ClampInnerWeight(float weight) {
+  if (static_cast<double>(weight) < 0.1) return 0.1f;
+  return weight > 10.0f ? 10.0f : weight;
+}
+
+}  // namespace n3ds

@@ -1,0 +1,25 @@
+// Solver weights and state of the face, read off the landmarks of one frame.
+#pragma once
+
+#include <cstdint>
+
+namespace n3ds {
+
+// The starting values stand where ComputePoseWeights stops early.
+struct PoseWeights {
+  int64_t mouth_open = 0;        // 1: the lips are apart
+  int64_t frontal = 0;           // 1: the face looks into the camera
+  int64_t weighting_switch = 1;  // 0: the face is turned, pitched or distorted
+  float contour = 0.0f;          // w1
+  float range = 0.0f;  // w2: less for an open mouth, whose lower face the mean shape lacks
+  float inner = 1.0f;  // w3: ratio of the half-widths of the face, 1 for a frontal one
+};
+
+// Landmarks: 95 pairs x, y. Returns 0; -1 for null landmarks. Just before a division by a distance
+// below 1e-6 it returns 0 and leaves what would have followed as it was.
+int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights);
+
+// w3 as the pose fits take it: within [0.1, 10].
+float ClampInnerWeight(float weight);
+
+}  // namespace n3ds
