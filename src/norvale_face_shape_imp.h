@@ -1,0 +1,53 @@
+// The object behind the exported engine handle: owns the tracking core, the model's bytes, the
+// orientation of the input and the output memory of mask mode.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "frame_processing.h"
+#include "norvale_3d_sticker_core.h"
+
+class CNorvaleFaceShapeImp {
+ public:
+  // Engine results as Norvale_3DSticker_* documents them.
+  MRESULT Initialize(const char* path, unsigned int degree, unsigned int mirror);
+  MRESULT InitializeEx(const unsigned char* data, unsigned int size, unsigned int degree,
+                       unsigned int mirror);
+  // Always 0. (The name is spelled as hosts of older versions know it from crash reports.)
+  MRESULT UnInitalize();
+  void SetDegreeAndMirror(unsigned int degree, unsigned int mirror);
+  static const Norvale_3DSticker_Version* GetVersion();
+
+  MRESULT ProcessFace(NSVL_OFFSCREEN* image, unsigned int nFaces, unsigned int nLandmarks,
+                      __tag_point* points, __tag_rect* rects, float* extra,
+                      Norvale_3DSticker_Matrix_Array* out);
+
+  // Maps one face's landmarks from the delivered picture to the upright, unmirrored one, and
+  // renumbers them when mirrored. `image` is the delivered picture. Returns nonzero; 0, with
+  // nothing written, when points or image are null or count is 0.
+  int TransformInputInfo(NSVL_OFFSCREEN* image, unsigned int count, __tag_point* points,
+                         N3DS_LANDMARK& out) const;
+
+ private:
+  static constexpr size_t kMaskVertexFloats = 3 * static_cast<size_t>(N3DS_MASK_CORNER_COUNT);
+  static constexpr size_t kMaskTextureFloats = 2 * static_cast<size_t>(N3DS_MASK_CORNER_COUNT);
+
+  using BuildFunction = MRESULT (*)(void* core, const NSVL_OFFSCREEN* image, N3DS_LANDMARK* faces,
+                                    int32_t nFaces);
+
+  // First half of a frame call, the same in both modes: maps the landmarks and runs a driver.
+  // Returns 0, or 1 for whatever went wrong.
+  MRESULT TrackFrame(BuildFunction build, NSVL_OFFSCREEN* image, unsigned int nFaces,
+                     unsigned int nLandmarks, __tag_point* points,
+                     n3ds::FrameRecords* records) const;
+  // Ends an initialisation: takes the orientation over, or returns to the uninitialised state.
+  MRESULT FinishInitialize(MRESULT result, unsigned int degree, unsigned int mirror);
+
+  uint32_t degree;       // clockwise turn of the delivered picture
+  uint32_t mirror;       // 1: mirrored
+  void* core;            // null while uninitialised
+  uint8_t* modelBuffer;  // the model's bytes; null while uninitialised
+  float maskVertices[N3DS_FACE_CAPACITY][kMaskVertexFloats];
+  float maskTexCoords[kMaskTextureFloats];
+};
