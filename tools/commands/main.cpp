@@ -1,0 +1,44 @@
+// n3ds: runs landmark tracks through the engine, judges and draws the results.
+#include <CLI/App.hpp>
+#include <CLI/Config.hpp>
+#include <CLI/Formatter.hpp>
+#include <cstdio>
+#include <exception>
+
+#include "commands/commands.h"
+#include "norvale_3d_sticker_engine.h"
+
+namespace {
+
+constexpr int kExitFailed = 1;
+constexpr int kExitUsage = 2;
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  CLI::App app("Runs landmark tracks through the Norvale 3-D sticker engine.", "n3ds");
+  app.set_version_flag("--version", Norvale_3DSticker_GetVersion()->versionText);
+  app.require_subcommand(1);
+  app.footer(
+      "Examples:\n"
+      "  n3ds track talk.track.jsonl --out talk.results.jsonl\n"
+      "  n3ds eval examples/tracks/synthetic_*.track.jsonl\n"
+      "  n3ds render talk.track.jsonl --out talk.mp4\n"
+      "  n3ds model info data/face_model.bin\n"
+      "'n3ds COMMAND --help' says more. The track format is described in\n"
+      "examples/tracks/README.md.");
+  n3ds::tool::AddTrackCommand(app);
+  n3ds::tool::AddModelCommand(app);
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError& error) {
+    // Asking for help arrives here too; CLI11 prints it.
+    if (error.get_exit_code() == 0) return app.exit(error);
+    std::fprintf(stderr, "n3ds: %s (--help shows how)\n", error.what());
+    return kExitUsage;
+  } catch (const std::exception& error) {
+    std::fprintf(stderr, "n3ds: %s\n", error.what());
+    return kExitFailed;
+  }
+  return 0;
+}

@@ -1,0 +1,34 @@
+// The face-model file as data: what 'n3ds model info' reports on and the renderer takes its head
+// from. The engine reads the file on its own.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace n3ds::tool {
+
+constexpr std::size_t kModelVertices = 1812;
+constexpr std::size_t kModelIdentities = 16;
+constexpr std::size_t kModelExpressions = 20;
+constexpr std::size_t kModelCoordinates = 3 * kModelVertices;
+
+struct FaceModelFile {
+  std::vector<std::int16_t> mean;        // x, y, z per vertex in 1/256 mm, pitched
+  std::vector<std::int16_t> identity;    // component after component, as the mean
+  std::vector<std::int16_t> expression;  // component after component, as the mean
+  std::vector<std::int8_t> interaction;  // identity (outer) by expression, as the mean; times 40
+};
+
+// Reads a file of the format; throws Error with what is wrong with size or header.
+FaceModelFile ReadFaceModelFile(const std::string& path);
+
+using Point3 = std::array<double, 3>;
+
+// The mean face in the frame of the engine's model matrix, mm: the file's shape is pitched by 20
+// degrees, which the engine's output takes back.
+std::vector<Point3> MeanFace(const FaceModelFile& model);
+
+}  // namespace n3ds::tool

@@ -1,0 +1,89 @@
+// Landmark tracks: what a face detector saw, frame by frame, as JSON lines (*.track.jsonl).
+//
+// Line 1 is the header, every further line one frame; docs in examples/tracks/README.md. The reader
+// trusts nothing: whatever is wrong with a file is reported as "FILE:LINE: one sentence".
+//
+// Frames: points are whole pixels of the picture as delivered, before it is un-mirrored and turned.
+// Truth is in the upright, unmirrored camera frame (x right, y down, z forward, mm) and its
+// landmark numbering; it takes the head frame (x to the image right, y up, z out of the face) to
+// the camera.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <istream>
+#include <optional>
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "support/error.h"
+
+namespace n3ds::tool {
+
+constexpr std::size_t kMaxTrackFaces = 5;       // what the engine accepts in one frame
+constexpr int kMaxTrackImageSize = 16384;       // pixels a side; beyond it a header is damaged
+constexpr std::size_t kMaxTrackLine = 1 << 20;  // bytes; the longest real line has about 60,000
+
+struct TrackTruth {
+  std::array<double, 9> rotation{};     // row-major, head to camera
+  std::array<double, 3> translation{};  // mm
+  std::vector<double> points3d;         // empty, or x, y, z per landmark in the camera frame, mm
+};
+
+struct TrackFace {
+  std::int64_t id = 0;               // the person, the same over the file
+  std::vector<std::int32_t> points;  // x, y per landmark
+  std::optional<TrackTruth> truth;
+};
+
+struct TrackFrame {
+  std::int64_t number = 0;
+  std::vector<TrackFace> faces;  // in any order, at most kMaxTrackFaces
+};
+
+struct TrackHeader {
+  int width = 0;  // of the picture as delivered
+  int height = 0;
+  double fps = 0;
+  int landmarks = 0;  // 101 or 165
+  int degree = 0;     // 0, 90, 180 or 270, clockwise turn of the delivered picture
+  int mirror = 0;     // 1 for a mirrored picture
+  std::string source;
+  std::string title;
+  std::optional<double> focal;      // true focal length in pixels; needed by truth
+  std::optional<double> noise_px;   // standard deviation of the noise a coordinate
+  std::optional<double> noise_rho;  // its correlation from frame to frame
+
+  bool turned() const { return degree == 90 || degree == 270; }
+  int upright_width() const { return turned() ? height : width; }
+  int upright_height() const { return turned() ? width : height; }
+};
+
+struct Track {
+  std::string name;  // file name without folder and .track.jsonl
+  TrackHeader header;
+  std::vector<TrackFrame> frames;  // at least one
+
+  bool HasTruth() const;          // every face has truth and the focal length is known
+  std::size_t FaceCount() const;  // face entries over all frames
+  std::size_t MostFaces() const;  // in one frame
+};
+
+// Something is wrong with a track; what() is "FILE:LINE: sentence", or "FILE: sentence" when the
+// file as a whole is at fault.
+class TrackError : public Error {
+ public:
+  using Error::Error;
+};
+
+// Reads a whole track. `name` stands for the file in messages.
+Track ReadTrack(std::istream& in, const std::string& name);
+Track ReadTrackFile(const std::string& path);
+
+// Writes a track in the compact form in which the reader takes it: rotations to six decimals,
+// lengths to a micrometre.
+void WriteTrack(std::ostream& out, const Track& track);
+
+}  // namespace n3ds::tool
