@@ -28,6 +28,7 @@ int main(int argc, char** argv) {
       "'n3ds COMMAND --help' says more. The track format is described in\n"
       "examples/tracks/README.md.");
   n3ds::tool::AddTrackCommand(app);
+  n3ds::tool::AddEvalCommand(app);
   n3ds::tool::AddModelCommand(app);
   try {
     app.parse(argc, argv);

@@ -1,0 +1,93 @@
+// n3ds eval: how far the engine's poses are from the truth of synthetic tracks.
+#include <CLI/App.hpp>
+#include <CLI/Config.hpp>
+#include <CLI/Formatter.hpp>
+#include <cstdio>
+#include <iostream>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "commands/commands.h"
+#include "commands/options.h"
+#include "engine/engine_session.h"
+#include "eval/metrics.h"
+#include "eval/score_table.h"
+#include "support/atomic_file.h"
+#include "support/progress.h"
+#include "tracks/track_file.h"
+
+namespace n3ds::tool {
+namespace {
+
+struct EvalOptions {
+  EngineOptions engine;
+  std::vector<std::string> tracks;
+  std::string csv;
+};
+
+void RunEvalCommand(const EvalOptions& options) {
+  std::vector<Track> tracks;
+  std::size_t frames = 0;
+  for (const std::string& path : options.tracks) {
+    tracks.push_back(ReadTrackFile(path));
+    if (!tracks.back().HasTruth()) {
+      throw Error(path + ": the track has no truth to compare with");
+    }
+    frames += tracks.back().frames.size();
+  }
+
+  std::vector<TrackPoses> poses;
+  {
+    Progress progress("tracking", frames);
+    for (const Track& track : tracks) {
+      poses.push_back(CameraPoses(
+          track,
+          RunTrack(track, options.engine.model, options.engine.mode(), [&] { progress.Step(); })));
+    }
+  }
+  std::vector<JudgedTrack> judged;
+  for (std::size_t k = 0; k < tracks.size(); ++k) {
+    judged.push_back({&tracks[k], &poses[k], EngineFocal(tracks[k].header)});
+  }
+  const HeadFrameOffset offset = EstimateOffset(judged);
+  NamedScores scores;
+  for (const JudgedTrack& one : judged) {
+    scores.emplace_back(one.track->name, ScoreTrack(one, offset));
+  }
+
+  const TextTable table = ScoreTable(scores);
+  if (!options.csv.empty()) {
+    AtomicFile out(options.csv);
+    table.PrintCsv(out.stream());
+    out.Commit();
+  }
+  table.Print(std::cout);
+  const Vector3 turn = RotationVector(offset.rotation);
+  std::printf("head frame: turned by %.2f %.2f %.2f degrees, origin at %.1f %.1f %.1f mm\n",
+              turn[0], turn[1], turn[2], offset.origin[0], offset.origin[1], offset.origin[2]);
+}
+
+}  // namespace
+
+void AddEvalCommand(CLI::App& app) {
+  CLI::App* command = app.add_subcommand(
+      "eval",
+      "Runs tracks that have truth through the engine and prints how far its poses are off.");
+  const auto options = std::make_shared<EvalOptions>();
+  command->add_option("tracks", options->tracks, "Landmark tracks with truth")
+      ->required()
+      ->type_name("FILE.track.jsonl");
+  command->add_option("--csv", options->csv, "The table as CSV")->type_name("FILE");
+  AddEngineOptions(*command, options->engine);
+  command->footer(
+      std::string("Columns:\n") + kScoreTableLegend +
+      "\nThe last line gives the constant offset between the truth's head frame and the\n"
+      "engine's that was taken off, estimated over all tracks together.\n"
+      "Examples:\n"
+      "  n3ds eval examples/tracks/yaw_sweep.track.jsonl\n"
+      "  n3ds eval *.track.jsonl --csv scores.csv");
+  command->callback([options] { RunEvalCommand(*options); });
+}
+
+}  // namespace n3ds::tool

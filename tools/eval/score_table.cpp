@@ -1,0 +1,74 @@
+#include "eval/score_table.h"
+
+#include "support/statistics.h"
+
+namespace n3ds::tool {
+namespace {
+
+constexpr double kYawLimits[] = {20, 40, 60};
+
+std::vector<double> Across(const Score& score) {
+  std::vector<double> values;
+  for (const PoseError& error : score.errors) values.push_back(error.across);
+  return values;
+}
+
+std::vector<double> Depth(const Score& score) {
+  std::vector<double> values;
+  for (const PoseError& error : score.errors) values.push_back(error.depth);
+  return values;
+}
+
+// "-" where there is nothing to judge.
+std::string Cell(const std::vector<double>& sample, double fraction, int decimals) {
+  return sample.empty() ? "-" : Decimal(Percentile(sample, fraction), decimals);
+}
+
+std::vector<std::string> Row(const std::string& name, const Score& score) {
+  std::vector<std::string> row = {name, std::to_string(score.faces), std::to_string(score.lost),
+                                  std::to_string(score.swaps), std::to_string(score.jumps)};
+  for (const double limit : kYawLimits) {
+    const std::vector<double> errors = score.RotationErrors(limit);
+    row.push_back(Cell(errors, 0.5, 2));
+    row.push_back(Cell(errors, 0.95, 2));
+  }
+  row.push_back(Cell(Across(score), 0.5, 1));
+  row.push_back(Cell(Across(score), 0.95, 1));
+  row.push_back(Cell(Depth(score), 0.5, 1));
+  row.push_back(Cell(Depth(score), 0.95, 1));
+  const bool rested = !score.rest_rotation.empty();
+  row.push_back(rested ? Decimal(RootMeanSquare(score.rest_rotation), 3) : "-");
+  row.push_back(rested ? Decimal(RootMeanSquare(score.rest_across), 2) : "-");
+  row.push_back(score.turning_moment > 0 ? Decimal(1000 * score.Lag(), 1) : "-");
+  return row;
+}
+
+}  // namespace
+
+const char kScoreTableLegend[] =
+    "faces      face entries with truth\n"
+    "lost       no pose, or one turned more than 45 degrees off\n"
+    "swaps      pose lies nearer to another person's place than to its own\n"
+    "jumps      error changes from one frame to the next by more than 8 degrees, 25 mm across or\n"
+    "           15 % of the depth\n"
+    "rot20..    rotation error in degrees, median and 95th percentile, of the heads turned by at\n"
+    "           most 20, 40 and 60 degrees, after one constant offset between the head frames\n"
+    "across     offset of the head's origin parallel to the picture, mm\n"
+    "depth      error of the distance in percent, for the true focal length\n"
+    "jit        root mean square of the error's change between frames, in degrees and mm, while\n"
+    "           the head turns by less than 15 degrees and moves by less than 60 mm a second\n"
+    "lag        by which the rotation trails the true one, ms\n";
+
+TextTable ScoreTable(const NamedScores& scores) {
+  TextTable table({"track", "faces", "lost", "swaps", "jumps", "rot20", "p95", "rot40", "p95",
+                   "rot60", "p95", "across", "p95", "depth", "p95", "jit deg", "jit mm", "lag"});
+  Score all;
+  for (const auto& [name, score] : scores) {
+    table.AddRow(Row(name, score));
+    all.Add(score);
+  }
+  if (scores.size() > 1) table.AddRow(Row("all", all));
+  return table;
+}
+
+}  // namespace n3ds::tool
