@@ -1,0 +1,92 @@
+#!/usr/bin/env bash
+# Installs the Debian packages that are missing; does nothing, and needs no rights, when none is.
+#   scripts/install_packages.sh GROUP...     groups: build tools test check arm64 bench
+# Other scripts may source this file and call `install_missing_packages GROUP...`.
+
+# packages_of GROUP: its packages, one a line, each with the reason it is needed.
+packages_of() {
+  case "$1" in
+    build)
+      echo 'g++                    # C++17 and C99 compiler'
+      echo 'cmake                  # describes the build'
+      echo 'ninja-build            # runs it'
+      ;;
+    tools)
+      echo 'nlohmann-json3-dev     # reads and writes landmark tracks'
+      echo 'libcli11-dev           # command line of n3ds'
+      echo 'libegl-dev             # OpenGL without a display'
+      echo 'libgles-dev            # OpenGL ES 3, draws the stickers'
+      echo 'libgl1-mesa-dri        # its software renderer, for machines without a GPU'
+      echo 'libpng-dev             # reads and writes PNG'
+      echo 'libjpeg62-turbo-dev    # reads photos'
+      echo 'ffmpeg                 # encodes MP4'
+      ;;
+    test)
+      echo 'libgtest-dev           # tests'
+      echo 'libgmock-dev           # matchers in tests'
+      echo 'nlohmann-json3-dev     # the tests read landmark tracks'
+      ;;
+    check)
+      echo 'clang                  # the second compiler'
+      echo 'clang-format           # formatting'
+      echo 'clang-tidy             # static analysis'
+      echo 'gcovr                  # branch coverage'
+      ;;
+    arm64)
+      echo 'g++-aarch64-linux-gnu  # cross compiler'
+      echo 'qemu-user-static       # runs its programs'
+      echo 'googletest             # GoogleTest as source, to be built for the target'
+      echo 'nlohmann-json3-dev     # the tests read landmark tracks'
+      ;;
+    bench)
+      echo 'libbenchmark-dev       # Google Benchmark'
+      echo 'libeigen3-dev          # peer of the matrix product'
+      echo 'libceres-dev           # peer of the pose solver'
+      echo 'libopencv-calib3d-dev  # peer of the tracking, solvePnP'
+      ;;
+    *)
+      echo "install_packages.sh: no group '$1' (build tools test check arm64 bench)" >&2
+      return 1
+      ;;
+  esac
+}
+
+install_missing_packages() {
+  local group packages missing=() package sudo=()
+  for group in "$@"; do
+    packages=$(packages_of "$group") || return 1
+    while read -r package _; do
+      if [ "$(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null)" != installed ]; then
+        missing+=("$package")
+      fi
+    done <<<"$packages"
+  done
+  if [ "${#missing[@]}" -eq 0 ]; then return 0; fi
+
+  if ! command -v apt-get >/dev/null; then
+    echo "install_packages.sh: not a Debian system; please install: ${missing[*]}" >&2
+    return 1
+  fi
+  if [ "$(id -u)" -ne 0 ]; then
+    if ! command -v sudo >/dev/null; then
+      echo "install_packages.sh: needs root or sudo to install: ${missing[*]}" >&2
+      return 1
+    fi
+    sudo=(sudo)
+  fi
+  echo "Installing ${missing[*]}"
+  # A lock held by another installation is waited for instead of failing at once.
+  local apt=("${sudo[@]}" env DEBIAN_FRONTEND=noninteractive
+    apt-get -qq -o DPkg::Lock::Timeout=600)
+  "${apt[@]}" update &&
+    "${apt[@]}" install -y --no-install-recommends "${missing[@]}" >/dev/null
+}
+
+if [ "${BASH_SOURCE[0]}" = "$0" ]; then
+  set -euo pipefail
+  if [ "$#" -eq 0 ]; then
+    echo "usage: scripts/install_packages.sh GROUP... (build tools test check arm64 bench)" >&2
+    exit 2
+  fi
+  install_missing_packages "$@"
+fi
