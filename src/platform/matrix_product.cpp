@@ -41,6 +41,9 @@ void MultiplyPortable(float* C, const float* A, const float* B, int32_t m, int32
 #ifdef N3DS_VECTOR_CODE
 namespace {
 
+// The accumulators only live in registers if the loops over them are gone before the optimiser
+// looks at the arrays; gcc 12 at -O3 stores all of them in every step otherwise.
+#define N3DS_UNROLL _Pragma("GCC unroll 16")
 #define N3DS_VECTOR_INLINE N3DS_VECTOR_CODE __attribute__((always_inline)) inline
 
 // A thin vector type: the tiles below are written once over these few operations.
@@ -51,7 +54,6 @@ constexpr int kLanes = 8;
 constexpr int kWidestTile = 3;  // blocks of kLanes columns: 4 x 3 accumulators of 16 registers
 constexpr int kTileRows = 4;    // rows of a tile two or more blocks wide
 constexpr int kNarrowRows = 8;  // rows of a tile one block wide
-constexpr int kRowGroups = 2;   // groups of kLanes rows the one-column form takes at a time
 using PartialMask = __m256i;    // which lanes of a partial block exist
 
 N3DS_VECTOR_INLINE Lanes Zero() { return _mm256_setzero_ps(); }
@@ -93,7 +95,6 @@ constexpr int kLanes = 4;
 constexpr int kWidestTile = 5;  // 4 x 5 accumulators of 32 registers
 constexpr int kTileRows = 4;
 constexpr int kNarrowRows = 8;
-constexpr int kRowGroups = 4;
 using PartialMask = int;  // how many lanes exist
 
 N3DS_VECTOR_INLINE Lanes Zero() { return vdupq_n_f32(0.0f); }
@@ -125,6 +126,10 @@ N3DS_VECTOR_INLINE void LoadColumns(const float* const* rows, ptrdiff_t offset, 
 
 #endif
 
+// Groups of kLanes rows the one-column form takes at once: as many as hide the latency of the one
+// chain of additions in each.
+constexpr int kMostRowGroups = 3;
+
 // Pointers to `count` rows of A from its first; rows beyond the last are the last again, so that a
 // tile always has all its rows and no load leaves A.
 template <int count>
@@ -139,26 +144,35 @@ template <int kRows, int kBlocks>
 N3DS_VECTOR_CODE void MultiplyTile(float* C, const float* A, const float* B, int32_t rows,
                                    int32_t k, int32_t n, int32_t j) {
   ptrdiff_t column[kBlocks];
+  N3DS_UNROLL
   for (int b = 0; b < kBlocks; ++b) column[b] = std::min(j + b * kLanes, n - kLanes);
   const float* row[kRows];
   RowPointers<kRows>(A, rows, k, row);
 
   Lanes sum[kRows][kBlocks];
+  N3DS_UNROLL
   for (int r = 0; r < kRows; ++r) {
+    N3DS_UNROLL
     for (int b = 0; b < kBlocks; ++b) sum[r][b] = Zero();
   }
   for (ptrdiff_t p = 0; p < k; ++p) {
     Lanes factor[kBlocks];
+    N3DS_UNROLL
     for (int b = 0; b < kBlocks; ++b) factor[b] = Load(B + column[b]);
+    N3DS_UNROLL
     for (int r = 0; r < kRows; ++r) {
       const Lanes a = Broadcast(row[r] + p);
+      N3DS_UNROLL
       for (int b = 0; b < kBlocks; ++b) sum[r][b] = MultiplyAdd(a, factor[b], sum[r][b]);
     }
     B += n;
   }
+  N3DS_UNROLL
   for (int r = 0; r < kRows; ++r) {
-    if (r >= rows) break;
-    for (int b = 0; b < kBlocks; ++b) Store(C + r * ptrdiff_t{n} + column[b], sum[r][b]);
+    N3DS_UNROLL
+    for (int b = 0; b < kBlocks; ++b) {
+      if (r < rows) Store(C + r * ptrdiff_t{n} + column[b], sum[r][b]);
+    }
   }
 }
 
@@ -170,17 +184,19 @@ N3DS_VECTOR_CODE void MultiplyNarrowTile(float* C, const float* A, const float* 
   RowPointers<kNarrowRows>(A, rows, k, row);
 
   Lanes sum[kNarrowRows];
+  N3DS_UNROLL
   for (int r = 0; r < kNarrowRows; ++r) sum[r] = Zero();
   for (ptrdiff_t p = 0; p < k; ++p) {
     const Lanes factor = LoadPartial(B, mask);
+    N3DS_UNROLL
     for (int r = 0; r < kNarrowRows; ++r) {
       sum[r] = MultiplyAdd(Broadcast(row[r] + p), factor, sum[r]);
     }
     B += n;
   }
+  N3DS_UNROLL
   for (int r = 0; r < kNarrowRows; ++r) {
-    if (r >= rows) break;
-    StorePartial(C + r * ptrdiff_t{n}, mask, sum[r]);
+    if (r < rows) StorePartial(C + r * ptrdiff_t{n}, mask, sum[r]);
   }
 }
 
@@ -192,89 +208,86 @@ N3DS_VECTOR_CODE void MultiplyColumnTile(float* C, const float* A, const float* 
   RowPointers<kGroups * kLanes>(A, rows, k, row);
 
   Lanes sum[kGroups];
+  N3DS_UNROLL
   for (int g = 0; g < kGroups; ++g) sum[g] = Zero();
   ptrdiff_t p = 0;
   for (; p + 4 <= k; p += 4) {
+    N3DS_UNROLL
     for (int g = 0; g < kGroups; ++g) {
       Lanes a[4];
       LoadColumns(row + g * kLanes, p, a);
+      N3DS_UNROLL
       for (int t = 0; t < 4; ++t) sum[g] = MultiplyAdd(a[t], Broadcast(B + p + t), sum[g]);
     }
   }
   float entries[kGroups * kLanes];
   for (; p < k; ++p) {
+    N3DS_UNROLL
     for (int r = 0; r < kGroups * kLanes; ++r) entries[r] = row[r][p];
+    N3DS_UNROLL
     for (int g = 0; g < kGroups; ++g) {
       sum[g] = MultiplyAdd(Load(entries + g * kLanes), Broadcast(B + p), sum[g]);
     }
   }
+  N3DS_UNROLL
   for (int g = 0; g < kGroups; ++g) Store(entries + g * kLanes, sum[g]);
   std::copy_n(entries, rows, C);
 }
 
-template <int kBlocks>
-N3DS_VECTOR_CODE void MultiplyColumns(float* C, const float* A, const float* B, int32_t m,
-                                      int32_t k, int32_t n, int32_t j) {
+// All rows of `blocks` blocks of columns from column j on.
+template <int kBlocks = 1>
+N3DS_VECTOR_CODE void MultiplyColumns(int blocks, float* C, const float* A, const float* B,
+                                      int32_t m, int32_t k, int32_t n, int32_t j) {
+  if constexpr (kBlocks < kWidestTile) {
+    if (blocks > kBlocks) {
+      MultiplyColumns<kBlocks + 1>(blocks, C, A, B, m, k, n, j);
+      return;
+    }
+  }
   constexpr int kRows = kBlocks == 1 ? kNarrowRows : kTileRows;
-  for (int32_t i = 0; i < m; i += std::min(kRows, m - i)) {
-    MultiplyTile<kRows, kBlocks>(C + i * ptrdiff_t{n}, A + i * ptrdiff_t{k}, B,
-                                 std::min(kRows, m - i), k, n, j);
+  for (int32_t i = 0; i < m;) {
+    const int32_t rows = std::min(kRows, m - i);
+    MultiplyTile<kRows, kBlocks>(C + i * ptrdiff_t{n}, A + i * ptrdiff_t{k}, B, rows, k, n, j);
+    i += rows;
   }
 }
 
-N3DS_VECTOR_CODE void MultiplyOneColumn(float* C, const float* A, const float* B, int32_t m,
-                                        int32_t k) {
-  int32_t i = 0;
-  while (i < m) {
-    const int32_t rows = std::min(kRowGroups * kLanes, m - i);
-    if (rows > kLanes) {
-      MultiplyColumnTile<kRowGroups>(C + i, A + i * ptrdiff_t{k}, B, rows, k);
-    } else {
-      MultiplyColumnTile<1>(C + i, A + i * ptrdiff_t{k}, B, rows, k);
+// `rows` rows, which take `groups` groups of lanes, of a single column.
+template <int kGroups = 1>
+N3DS_VECTOR_CODE void MultiplyRowGroups(int groups, float* C, const float* A, const float* B,
+                                        int32_t rows, int32_t k) {
+  if constexpr (kGroups < kMostRowGroups) {
+    if (groups > kGroups) {
+      MultiplyRowGroups<kGroups + 1>(groups, C, A, B, rows, k);
+      return;
     }
-    i += rows;
   }
+  MultiplyColumnTile<kGroups>(C, A, B, rows, k);
 }
 
 N3DS_VECTOR_CODE void MultiplyVector(float* C, const float* A, const float* B, int32_t m, int32_t k,
                                      int32_t n) {
   if (n == 1) {
-    MultiplyOneColumn(C, A, B, m, k);
-    return;
-  }
-  if (n < kLanes) {
-    for (int32_t i = 0; i < m; i += std::min(kNarrowRows, m - i)) {
-      MultiplyNarrowTile(C + i * ptrdiff_t{n}, A + i * ptrdiff_t{k}, B,
-                         std::min(kNarrowRows, m - i), k, n);
+    for (int32_t i = 0; i < m;) {
+      const int32_t rows = std::min(kMostRowGroups * kLanes, m - i);
+      MultiplyRowGroups((rows - 1) / kLanes + 1, C + i, A + i * ptrdiff_t{k}, B, rows, k);
+      i += rows;
     }
-    return;
-  }
-  int32_t j = 0;
-  while (j < n) {
-    const int32_t blocks_left = (n - j - 1) / kLanes + 1;
-    // What is left goes at once if it fits. Otherwise a tile one block below the widest, so that
-    // the last one is never a lone block: four go as 2 + 2, not as 3 + 1.
-    const int32_t blocks = blocks_left <= kWidestTile ? blocks_left : kWidestTile - 1;
-    switch (blocks) {
-      case 1:
-        MultiplyColumns<1>(C, A, B, m, k, n, j);
-        break;
-      case 2:
-        MultiplyColumns<2>(C, A, B, m, k, n, j);
-        break;
-#if N3DS_NEON_PRODUCT
-      case 4:
-        MultiplyColumns<4>(C, A, B, m, k, n, j);
-        break;
-      case 5:
-        MultiplyColumns<5>(C, A, B, m, k, n, j);
-        break;
-#endif
-      default:
-        MultiplyColumns<3>(C, A, B, m, k, n, j);
-        break;
+  } else if (n < kLanes) {
+    for (int32_t i = 0; i < m;) {
+      const int32_t rows = std::min(kNarrowRows, m - i);
+      MultiplyNarrowTile(C + i * ptrdiff_t{n}, A + i * ptrdiff_t{k}, B, rows, k, n);
+      i += rows;
     }
-    j += std::min(blocks * kLanes, n - j);
+  } else {
+    for (int32_t j = 0; j < n;) {
+      // What is left goes at once if it fits. Otherwise a tile one block below the widest, so that
+      // the last one is never a lone block: four go as 2 + 2, not as 3 + 1.
+      const int32_t blocks_left = (n - j - 1) / kLanes + 1;
+      const int32_t blocks = blocks_left <= kWidestTile ? blocks_left : kWidestTile - 1;
+      MultiplyColumns(blocks, C, A, B, m, k, n, j);
+      j += std::min(blocks * kLanes, n - j);
+    }
   }
 }
 
