@@ -1,4 +1,7 @@
 // Life of a core context: creation, face model, release.
+
+// The system's assertion handler is declared only where assertions are on.
+#undef NDEBUG
 #include <cassert>
 #include <cstring>
 
