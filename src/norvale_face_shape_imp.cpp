@@ -3,30 +3,34 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <limits>
 
 #include "core/model_tables.h"
 
 namespace {
 
-// Reads a whole file into memory of the system heap. Null when it cannot be read; the caller frees
-// it.
-uint8_t* ReadFile(const char* path, size_t* size) {
+// Reads a whole file into memory of the system heap, which the caller frees. Returns 0; 1 when the
+// file cannot be read; -201.
+MRESULT ReadFile(const char* path, uint8_t** bytes, size_t* size) {
   std::FILE* file = std::fopen(path, "rb");
-  if (file == nullptr) return nullptr;
-  uint8_t* bytes = nullptr;
+  if (file == nullptr) return N3DS_FAILED;
+  MRESULT result = N3DS_FAILED;
   long length = -1;
   if (std::fseek(file, 0, SEEK_END) == 0) length = std::ftell(file);
-  if (length >= 0 && std::fseek(file, 0, SEEK_SET) == 0) {
+  // A directory can be opened, but on some file systems its end lies at the largest number.
+  const bool has_end = length >= 0 && length < std::numeric_limits<long>::max();
+  if (has_end && std::fseek(file, 0, SEEK_SET) == 0) {
     *size = static_cast<size_t>(length);
     // One byte at least: an empty file is read, and the loader says what it thinks of it.
-    bytes = static_cast<uint8_t*>(std::malloc(*size > 0 ? *size : 1));
-    if (bytes != nullptr && std::fread(bytes, 1, *size, file) != *size) {
-      std::free(bytes);
-      bytes = nullptr;
+    *bytes = static_cast<uint8_t*>(std::malloc(*size > 0 ? *size : 1));
+    if (*bytes == nullptr) {
+      result = N3DS_NO_MEMORY;
+    } else if (std::fread(*bytes, 1, *size, file) == *size) {
+      result = N3DS_OK;
     }
   }
   std::fclose(file);
-  return bytes;
+  return result;
 }
 
 }  // namespace
@@ -36,8 +40,8 @@ MRESULT CNorvaleFaceShapeImp::Initialize(const char* path, unsigned int new_degr
   MRESULT result = N3DS_FAILED;
   if (path != nullptr && N3DS_Init(nullptr, &core) == N3DS_OK && core != nullptr) {
     size_t size = 0;
-    modelBuffer = ReadFile(path, &size);
-    if (modelBuffer != nullptr) result = N3DS_LoadFaceHouse(core, modelBuffer, size);
+    result = ReadFile(path, &modelBuffer, &size);
+    if (result == N3DS_OK) result = N3DS_LoadFaceHouse(core, modelBuffer, size);
   }
   return FinishInitialize(result, new_degree, new_mirror);
 }
