@@ -61,7 +61,7 @@ float MeanOutlineSpacing(const int32_t* landmarks) {
 // infinite or not a number.
 int32_t ProbeCount(const HullPoint& a, const HullPoint& b, float spacing) {
   const double length = std::sqrt(static_cast<double>(SquaredDistance(a.x, a.y, b.x, b.y)));
-  const auto ratio = static_cast<float>(length / static_cast<double>(spacing));
+  const float ratio = static_cast<float>(length) / spacing;
   if (!(static_cast<double>(ratio) > kProbeSpacing && ratio < kLongestProbedEdge)) return 0;
   return TruncateToInt32(static_cast<double>(ratio) / kProbeSpacing);
 }
