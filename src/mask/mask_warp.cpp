@@ -1,0 +1,67 @@
+// The exported mask warp: checks, the output picture, and the tracked face's pose and camera.
+#include <cstddef>
+#include <cstdint>
+#include <limits>
+
+#include "core/tracking_context.h"
+#include "mask/warp_face.h"
+#include "math/integer_arithmetic.h"
+#include "norvale_3d_sticker_core.h"
+
+namespace {
+
+using n3ds::TrackingContext;
+
+// Gives an output without a buffer the given size and a buffer of the core's memory. The
+// descriptor's fields stand even when there is no memory.
+bool SetUpOutput(MHandle memory, int32_t width, int32_t height, NSVL_OFFSCREEN* output) {
+  output->pixelFormat = N3DS_FORMAT_BGRA32;
+  output->width = width;
+  output->height = height;
+  output->pitch[0] = n3ds::WrapMultiply(width, 4);
+  if (width > std::numeric_limits<int32_t>::max() / 4) return false;
+
+  // A pool reads sizes as 32 bits and would hand out a smaller block.
+  const uint64_t bytes = uint64_t{4} * static_cast<uint64_t>(width) * static_cast<uint64_t>(height);
+  if (memory != nullptr && bytes > std::numeric_limits<uint32_t>::max()) return false;
+  output->plane[0] = static_cast<uint8_t*>(MMemAlloc(memory, bytes));
+  return output->plane[0] != nullptr;
+}
+
+void Clear(const NSVL_OFFSCREEN& picture) {
+  if (picture.pitch[0] <= 0 || picture.height <= 0) return;
+  MMemSet(picture.plane[0], 0,
+          static_cast<size_t>(picture.pitch[0]) * static_cast<size_t>(picture.height));
+}
+
+}  // namespace
+
+MRESULT N3DS_WarpFaceMask(void* core, const N3DS_2D_TEXTURE_MASK* mask, NSVL_OFFSCREEN* output,
+                          const N3DS_3D_MODEL* model, int32_t width, int32_t height,
+                          int32_t faceIndex) {
+  if (core == nullptr || mask == nullptr || output == nullptr || model == nullptr ||
+      model->vertices == nullptr || model->triangles == nullptr) {
+    return N3DS_NULL_ARGUMENT;
+  }
+  const auto& context = *static_cast<const TrackingContext*>(core);
+  const NSVL_OFFSCREEN& picture = mask->image;
+  if (width <= 0 || height <= 0 || picture.plane[0] == nullptr || picture.width <= 0 ||
+      picture.height <= 0 || picture.pixelFormat != N3DS_FORMAT_BGRA32 || faceIndex < 0 ||
+      static_cast<uint32_t>(faceIndex) >= context.faceNum) {
+    return N3DS_BAD_VALUE;
+  }
+
+  if (output->plane[0] == nullptr && !SetUpOutput(context.memory, width, height, output)) {
+    return N3DS_NO_MEMORY;
+  }
+  Clear(*output);
+
+  // A face that was never fitted has no pose, and its picture stays clear.
+  if (context.trackFlag[faceIndex] == 0) return N3DS_OK;
+  const float* p = context.maskPose[faceIndex];
+  const float R[9] = {p[0], p[1], p[2], p[4], p[5], p[6], p[8], p[9], p[10]};
+  const float t[3] = {p[3], p[7], p[11]};
+  // Wrong counts in the texture record draw nothing, which is all the caller is told.
+  n3ds::WarpFace(*model, *mask, context.camera, R, t, *output);
+  return N3DS_OK;
+}
