@@ -245,7 +245,8 @@ N3DS_API void* mcvParallelInit(MHandle memory, uint32_t threads);
 /* Stops the workers, waits for them and frees the pool. Returns 0; -1 null; -3 when another call is
  * already doing so. */
 N3DS_API int32_t mcvParallelUninit(void* pool);
-/* Queues a task. Returns its id (at least 0); -1 null pool or function; -4 when 32 tasks are pending.
+/* Queues a task. Returns its id (at least 0); -1 null pool or function; -4 when 32 tasks are
+ * pending.
  */
 N3DS_API int32_t mcvAddTask(void* pool, mcvTaskFunction function, void* argument);
 /* Waits until the task of that id has finished. Returns 0; -1 null pool. Each id can be waited for
