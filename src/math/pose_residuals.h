@@ -1,0 +1,71 @@
+// The residuals that the pose solver minimises: how far a head model's points, moved by a pose and
+// projected by a pinhole camera, land from a face's landmarks in the picture.
+#pragma once
+
+#include <cstdint>
+
+#include "norvale_3d_sticker_core.h"
+
+namespace n3ds {
+
+// A pose is a quaternion w, x, y, z, used at whatever length it has, and a translation. It is
+// always seven floats, also when fewer or more parameters are asked for.
+constexpr int32_t kPoseParameters = 7;
+
+// One fit's observations and weights; the arrays belong to the caller of the solver.
+struct PoseProblem {
+  const float* landmarks;     // x, y per point, pixels
+  const float* model_points;  // X, Y, Z per point
+  int32_t point_count;
+  const float* camera;
+  float contour_weight;     // weight of an outline landmark's distance across the middle line
+  float range_weight;       // weight of the parts that speech moves, the mouth and the chin
+  int64_t weighting_mode;   // not 0: landmarks other than eye corners and nose count a tenth
+  float inner_weight;       // balance between the two sides of the nose, 1 when alike
+  int32_t parameter_count;  // columns of the Jacobian
+};
+
+// The residual function of one problem. What no pose changes is worked out once, on construction.
+class PoseResiduals {
+ public:
+  explicit PoseResiduals(const PoseProblem& problem);
+
+  // r: two residuals per point, projected minus observed, weighted. Returns N3DS_NUMERICAL, with r
+  // partly written, when a point has no depth.
+  MRESULT Evaluate(const float* pose, float* r) const;
+
+  // The same with the Jacobian J of r (2 point_count x parameter_count, row-major; columns beyond
+  // the seventh are weighted like the others, but have no derivative of their own), J^T J and the
+  // gradient g = J^T r. Returns also N3DS_NO_MEMORY.
+  MRESULT Evaluate(MHandle memory, const float* pose, float* r, float* J, float* JtJ,
+                   float* g) const;
+
+ private:
+  enum class Middle : uint8_t { kNone, kVertical, kHorizontal, kOblique };
+
+  // The line through the middle of the face, from the chin to between the eyes: x = position when
+  // vertical, y = position when horizontal, else y = slope x + offset.
+  struct MiddleLine {
+    Middle kind = Middle::kNone;
+    float position = 0.0f;
+    float slope = 0.0f;
+    float offset = 0.0f;
+    float normal = 0.0f;          // the line's normal direction is (1, normal)
+    float normal_squared = 1.0f;  // its squared length
+  };
+
+  static MiddleLine FindMiddleLine(const PoseProblem& problem);
+  // Whether an outline landmark's observation (ox, oy) lies nearer the line than its projection.
+  bool LiesInside(float u, float v, float ox, float oy) const;
+  // Turns a component pair along u and v (residuals or derivatives) into its part across the line.
+  void ProjectAcross(float* along_u, float* along_v, int32_t count) const;
+
+  template <bool kDerivatives>
+  MRESULT EvaluatePoints(const float* pose, float* r, float* J) const;
+
+  PoseProblem problem_;
+  float group_factor_[4];  // by the landmark's group
+  MiddleLine middle_;
+};
+
+}  // namespace n3ds
