@@ -29,6 +29,7 @@ int main(int argc, char** argv) {
       "examples/tracks/README.md.");
   n3ds::tool::AddTrackCommand(app);
   n3ds::tool::AddEvalCommand(app);
+  n3ds::tool::AddRenderCommand(app);
   n3ds::tool::AddModelCommand(app);
   try {
     app.parse(argc, argv);

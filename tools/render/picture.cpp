@@ -1,0 +1,171 @@
+#include "render/picture.h"
+
+#include <jpeglib.h>
+#include <png.h>
+
+#include <algorithm>
+#include <csetjmp>
+#include <cstdio>  // before jpeglib.h, which needs FILE
+#include <fstream>
+#include <iterator>
+
+#include "support/atomic_file.h"
+#include "support/error.h"
+
+namespace n3ds::tool {
+namespace {
+
+constexpr int kLargestSide = 16384;
+
+std::vector<unsigned char> ReadBytes(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  if (!in) throw Error(path + ": the picture cannot be opened");
+  std::vector<unsigned char> bytes{std::istreambuf_iterator<char>(in), {}};
+  if (in.bad() || bytes.empty()) throw Error(path + ": the picture cannot be read");
+  return bytes;
+}
+
+void CheckSize(const std::string& path, std::size_t width, std::size_t height) {
+  if (width < 1 || height < 1 || width > kLargestSide || height > kLargestSide) {
+    throw Error(path + ": a picture of " + std::to_string(width) + " x " + std::to_string(height) +
+                " pixels is not accepted");
+  }
+}
+
+Picture DecodePng(const std::string& path, const std::vector<unsigned char>& bytes) {
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  const auto fail = [&]() {
+    const std::string reason = image.message;
+    png_image_free(&image);
+    throw Error(path + ": not a whole PNG file (" + reason + ")");
+  };
+  if (png_image_begin_read_from_memory(&image, bytes.data(), bytes.size()) == 0) fail();
+  image.format = PNG_FORMAT_RGBA;
+  if (image.width > kLargestSide || image.height > kLargestSide) {
+    png_image_free(&image);
+    CheckSize(path, image.width, image.height);
+  }
+  Picture picture(static_cast<int>(image.width), static_cast<int>(image.height));
+  const png_color white = {255, 255, 255};
+  if (png_image_finish_read(&image, &white, picture.rgba.data(), 0, nullptr) == 0) fail();
+  return picture;
+}
+
+// libjpeg reports errors by a callback that must not return.
+struct JpegError {
+  jpeg_error_mgr manager;
+  std::jmp_buf escape;
+  char message[JMSG_LENGTH_MAX];
+};
+
+[[noreturn]] void OnJpegError(j_common_ptr info) {
+  auto* error = reinterpret_cast<JpegError*>(info->err);
+  info->err->format_message(info, error->message);
+  std::longjmp(error->escape, 1);
+}
+
+void OnJpegMessage(j_common_ptr) {}
+
+// Decodes into `picture`; false with a message in `error`. No object with a destructor may live in
+// this function between setjmp and longjmp, so everything is handed in.
+bool DecodeJpegInto(const std::vector<unsigned char>& bytes, jpeg_decompress_struct& info,
+                    JpegError& error, Picture& picture) {
+  if (setjmp(error.escape) != 0) return false;
+  jpeg_mem_src(&info, bytes.data(), static_cast<unsigned long>(bytes.size()));
+  jpeg_read_header(&info, TRUE);
+  info.out_color_space = JCS_EXT_RGBA;
+  jpeg_start_decompress(&info);
+  if (info.output_width > kLargestSide || info.output_height > kLargestSide) {
+    std::snprintf(error.message, sizeof error.message, "too large");
+    return false;
+  }
+  picture = Picture(static_cast<int>(info.output_width), static_cast<int>(info.output_height));
+  while (info.output_scanline < info.output_height) {
+    JSAMPROW row = picture.Pixel(0, static_cast<int>(info.output_scanline));
+    jpeg_read_scanlines(&info, &row, 1);
+  }
+  jpeg_finish_decompress(&info);
+  if (info.err->num_warnings > 0) {
+    std::snprintf(error.message, sizeof error.message, "damaged or cut off");
+    return false;
+  }
+  return true;
+}
+
+Picture DecodeJpeg(const std::string& path, const std::vector<unsigned char>& bytes) {
+  JpegError error{};
+  jpeg_decompress_struct info{};
+  info.err = jpeg_std_error(&error.manager);
+  error.manager.error_exit = OnJpegError;
+  error.manager.output_message = OnJpegMessage;
+  jpeg_create_decompress(&info);
+  Picture picture;
+  const bool decoded = DecodeJpegInto(bytes, info, error, picture);
+  jpeg_destroy_decompress(&info);
+  if (!decoded) throw Error(path + ": not a whole JPEG file (" + error.message + ")");
+  return picture;
+}
+
+}  // namespace
+
+Picture ReadPicture(const std::string& path) {
+  const std::vector<unsigned char> bytes = ReadBytes(path);
+  if (bytes.size() > 8 && png_sig_cmp(bytes.data(), 0, 8) == 0) return DecodePng(path, bytes);
+  if (bytes.size() > 2 && bytes[0] == 0xff && bytes[1] == 0xd8) return DecodeJpeg(path, bytes);
+  throw Error(path + ": neither a PNG nor a JPEG picture");
+}
+
+void WritePng(const std::string& path, const Picture& picture) {
+  png_image image{};
+  image.version = PNG_IMAGE_VERSION;
+  image.width = static_cast<png_uint_32>(picture.width);
+  image.height = static_cast<png_uint_32>(picture.height);
+  image.format = PNG_FORMAT_RGBA;
+  std::vector<unsigned char> bytes;
+  png_alloc_size_t size = PNG_IMAGE_PNG_SIZE_MAX(image);
+  bytes.resize(size);
+  if (png_image_write_to_memory(&image, bytes.data(), &size, 0, picture.rgba.data(), 0, nullptr) ==
+      0) {
+    throw Error(path + ": the PNG cannot be made (" + std::string(image.message) + ")");
+  }
+  AtomicFile out(path);
+  out.stream().write(reinterpret_cast<const char*>(bytes.data()),
+                     static_cast<std::streamsize>(size));
+  out.Commit();
+}
+
+Picture Upright(const Picture& delivered, int degree, bool mirror) {
+  const bool turned = degree == 90 || degree == 270;
+  const int w = delivered.width;
+  const int h = delivered.height;
+  Picture upright(turned ? h : w, turned ? w : h);
+  for (int y = 0; y < h; ++y) {
+    for (int x = 0; x < w; ++x) {
+      const int mx = mirror ? w - 1 - x : x;
+      int ux = mx;
+      int uy = y;
+      if (degree == 90) {
+        ux = h - 1 - y;
+        uy = mx;
+      } else if (degree == 180) {
+        ux = w - 1 - mx;
+        uy = h - 1 - y;
+      } else if (degree == 270) {
+        ux = y;
+        uy = w - 1 - mx;
+      }
+      std::copy_n(delivered.Pixel(x, y), 4, upright.Pixel(ux, uy));
+    }
+  }
+  return upright;
+}
+
+void Paste(const Picture& source, int x, int y, Picture& target) {
+  for (int row = 0; row < source.height; ++row) {
+    std::copy_n(source.Pixel(0, row), 4 * static_cast<std::size_t>(source.width),
+                target.Pixel(x, y + row));
+  }
+}
+
+}  // namespace n3ds::tool

@@ -1,0 +1,222 @@
+#include "render/scene.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "engine/face_model_file.h"
+#include "render/obj_file.h"
+#include "render/shapes.h"
+
+namespace n3ds::tool {
+namespace {
+
+// Lit from the upper left before the head, softly from all sides; seen from both sides, because a
+// hat has an inside.
+const char kSolidVertex[] = R"(
+layout(location = 0) in vec3 position;
+layout(location = 1) in vec3 normal;
+uniform mat4 projection;
+uniform mat4 view;
+uniform mat4 model;
+out vec3 eye_position;
+out vec3 eye_normal;
+void main() {
+  vec4 eye = view * model * vec4(position, 1.0);
+  eye_position = eye.xyz;
+  eye_normal = mat3(view) * mat3(model) * normal;
+  gl_Position = projection * eye;
+})";
+
+const char kSolidFragment[] = R"(
+in vec3 eye_position;
+in vec3 eye_normal;
+uniform vec3 colour;
+uniform float opacity;
+uniform float gloss;
+out vec4 result;
+void main() {
+  vec3 n = normalize(gl_FrontFacing ? eye_normal : -eye_normal);
+  vec3 to_light = normalize(vec3(-0.45, 0.75, 0.70));
+  vec3 to_viewer = normalize(-eye_position);
+  float sky = 0.5 + 0.5 * n.y;
+  float direct = max(dot(n, to_light), 0.0);
+  float highlight = pow(max(dot(n, normalize(to_light + to_viewer)), 0.0), 40.0) * gloss;
+  vec3 lit = colour * (mix(0.30, 0.50, sky) + 0.60 * direct) + vec3(highlight);
+  result = vec4(lit, clamp(opacity + highlight, 0.0, 1.0));
+})";
+
+const char kDotVertex[] = R"(
+layout(location = 0) in vec3 position;
+uniform mat4 projection;
+uniform mat4 view;
+uniform mat4 model;
+uniform float size;
+void main() {
+  gl_Position = projection * view * model * vec4(position, 1.0);
+  gl_PointSize = size;
+})";
+
+const char kDotFragment[] = R"(
+uniform float size;
+out vec4 result;
+void main() {
+  float radius = length(gl_PointCoord - 0.5) * size;
+  result = vec4(0.10, 0.95, 0.55, clamp(0.5 * size - radius, 0.0, 1.0));
+})";
+
+// One triangle over the whole picture; `place` runs from (0, 0) in the upper left corner to (1, 1).
+const char kGroundVertex[] = R"(
+out vec2 place;
+void main() {
+  vec2 corner = vec2(float((gl_VertexID << 1) & 2), float(gl_VertexID & 2));
+  place = vec2(corner.x, 1.0 - corner.y);
+  gl_Position = vec4(corner * 2.0 - 1.0, 0.0, 1.0);
+})";
+
+const char kGroundFragment[] = R"(
+in vec2 place;
+uniform bool has_picture;
+uniform sampler2D picture;
+out vec4 result;
+void main() {
+  float shade = 0.62 - 0.22 * place.y - 0.10 * length(place - 0.5);
+  result = has_picture ? vec4(texture(picture, place).rgb, 1.0)
+                       : vec4(vec3(0.92, 0.97, 1.04) * shade, 1.0);
+})";
+
+std::string Asset(const char* name) { return std::string(N3DS_ASSET_DIR "/") + name; }
+
+void SetMatrices(const GlProgram& program, const FaceResult& face) {
+  program.Use();
+  glUniformMatrix4fv(program.Uniform("projection"), 1, GL_FALSE, face.projection.data());
+  glUniformMatrix4fv(program.Uniform("view"), 1, GL_FALSE, face.view.data());
+  glUniformMatrix4fv(program.Uniform("model"), 1, GL_FALSE, face.model.data());
+}
+
+GLuint UploadTexture(const Picture& picture) {
+  GLuint texture = 0;
+  glGenTextures(1, &texture);
+  glBindTexture(GL_TEXTURE_2D, texture);
+  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA8, picture.width, picture.height, 0, GL_RGBA,
+               GL_UNSIGNED_BYTE, picture.rgba.data());
+  // Photos are often larger than what is drawn: without smaller copies they would flicker.
+  glGenerateMipmap(GL_TEXTURE_2D);
+  glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR_MIPMAP_LINEAR);
+  glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MAG_FILTER, GL_LINEAR);
+  glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_S, GL_CLAMP_TO_EDGE);
+  glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_WRAP_T, GL_CLAMP_TO_EDGE);
+  return texture;
+}
+
+}  // namespace
+
+Scene::Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
+             const std::optional<Picture>& background, int width, int height)
+    : header_(header),
+      parts_(parts),
+      target_(width, height),
+      solid_(kSolidVertex, kSolidFragment),
+      dots_(kDotVertex, kDotFragment),
+      ground_(kGroundVertex, kGroundFragment),
+      face_(FaceMesh(ReadFaceModelFile(model_path))),
+      skull_(SkullMesh()),
+      glasses_(ReadObj(Asset("glasses.obj"))),
+      hat_(ReadObj(Asset("hat.obj"))),
+      tripod_(TripodMesh()) {
+  glGenVertexArrays(1, &dot_array_);
+  glGenBuffers(1, &dot_buffer_);
+  if (background) background_ = UploadTexture(*background);
+}
+
+Scene::~Scene() {
+  glDeleteTextures(1, &background_);
+  glDeleteBuffers(1, &dot_buffer_);
+  glDeleteVertexArrays(1, &dot_array_);
+}
+
+Picture Scene::Draw(const FrameResult& frame) {
+  target_.Bind();
+  glViewport(0, 0, target_.width(), target_.height());
+  glClear(GL_DEPTH_BUFFER_BIT);
+  DrawBackground();
+
+  // The matrices are made for a viewport of even size; an odd last column or row lies outside of
+  // it.
+  const auto even_share = [](int size) { return static_cast<double>(size / 2 * 2) / size; };
+  const auto width =
+      static_cast<GLsizei>(std::lround(target_.width() * even_share(header_.upright_width())));
+  const auto height =
+      static_cast<GLsizei>(std::lround(target_.height() * even_share(header_.upright_height())));
+  glViewport(0, target_.height() - height, width, height);
+
+  std::vector<const FaceResult*> faces;
+  for (const FaceResult& face : frame.faces) {
+    if (IsFinite(face)) faces.push_back(&face);
+  }
+  glEnable(GL_DEPTH_TEST);
+  for (const FaceResult* face : faces) DrawHead(*face);
+  for (const FaceResult* face : faces) DrawStickers(*face, true);
+  // Lenses let what is behind them shine through, so they come last and hide nothing.
+  glEnable(GL_BLEND);
+  glBlendFuncSeparate(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA, GL_ZERO, GL_ONE);
+  glDepthMask(GL_FALSE);
+  for (const FaceResult* face : faces) DrawStickers(*face, false);
+  glDisable(GL_DEPTH_TEST);
+  if (parts_.landmarks) {
+    for (const FaceResult* face : faces) DrawLandmarks(*face);
+  }
+  glDepthMask(GL_TRUE);
+  glDisable(GL_BLEND);
+  return target_.Read();
+}
+
+void Scene::DrawBackground() const {
+  ground_.Use();
+  glBindTexture(GL_TEXTURE_2D, background_);
+  glUniform1i(ground_.Uniform("has_picture"), background_ != 0 ? 1 : 0);
+  glUniform1i(ground_.Uniform("picture"), 0);
+  glBindVertexArray(dot_array_);
+  glDrawArrays(GL_TRIANGLES, 0, 3);
+}
+
+void Scene::DrawHead(const FaceResult& face) const {
+  const GLboolean seen = parts_.head ? GL_TRUE : GL_FALSE;
+  glColorMask(seen, seen, seen, GL_FALSE);
+  DrawMesh(face_, face, true);
+  DrawMesh(skull_, face, true);
+  glColorMask(GL_TRUE, GL_TRUE, GL_TRUE, GL_TRUE);
+}
+
+void Scene::DrawStickers(const FaceResult& face, bool opaque) const {
+  if (parts_.hat) DrawMesh(hat_, face, opaque);
+  if (parts_.glasses) DrawMesh(glasses_, face, opaque);
+  if (parts_.axes) DrawMesh(tripod_, face, opaque);
+}
+
+void Scene::DrawMesh(const GpuMesh& mesh, const FaceResult& face, bool opaque) const {
+  SetMatrices(solid_, face);
+  for (const MeshPart& part : mesh.parts()) {
+    if ((part.material.opacity >= 1) != opaque) continue;
+    glUniform3fv(solid_.Uniform("colour"), 1, part.material.colour.data());
+    glUniform1f(solid_.Uniform("opacity"), part.material.opacity);
+    glUniform1f(solid_.Uniform("gloss"), part.material.gloss);
+    mesh.DrawPart(part);
+  }
+}
+
+void Scene::DrawLandmarks(const FaceResult& face) const {
+  SetMatrices(dots_, face);
+  // Large enough to be seen, small enough that lids and lips stay apart.
+  const double scale = static_cast<double>(target_.width()) / header_.upright_width();
+  glUniform1f(dots_.Uniform("size"), static_cast<float>(std::clamp(3.0 * scale, 2.5, 5.0)));
+  glBindVertexArray(dot_array_);
+  glBindBuffer(GL_ARRAY_BUFFER, dot_buffer_);
+  glBufferData(GL_ARRAY_BUFFER, static_cast<GLsizeiptr>(face.landmarks3d.size() * sizeof(float)),
+               face.landmarks3d.data(), GL_STREAM_DRAW);
+  glEnableVertexAttribArray(0);
+  glVertexAttribPointer(0, 3, GL_FLOAT, GL_FALSE, 0, nullptr);
+  glDrawArrays(GL_POINTS, 0, static_cast<GLsizei>(face.landmarks3d.size() / 3));
+  glDisableVertexAttribArray(0);
+}
+
+}  // namespace n3ds::tool

@@ -1,0 +1,63 @@
+// Draws what a user of stickers sees: a picture or a plain ground, and on every face a hat and a
+// pair of glasses, placed by nothing but the engine's three matrices.
+//
+// Everything is drawn in the upright, unmirrored picture.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "engine/face_results.h"
+#include "render/egl_context.h"
+#include "render/gl_program.h"
+#include "render/gpu_mesh.h"
+#include "render/picture.h"
+#include "render/render_target.h"
+#include "tracks/track_file.h"
+
+namespace n3ds::tool {
+
+struct SceneParts {
+  bool glasses = true;
+  bool hat = true;
+  bool axes = true;
+  bool landmarks = true;
+  bool head = false;  // draw the head itself instead of only letting it hide what is behind it
+};
+
+class Scene {
+ public:
+  // `background` is upright already; without one the ground is plain. Throws Error when the model
+  // or an asset cannot be read or the graphics system refuses.
+  Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
+        const std::optional<Picture>& background, int width, int height);
+  ~Scene();
+
+  // The result stays valid on its own. Faces without a finite pose are left out.
+  Picture Draw(const FrameResult& frame);
+
+ private:
+  void DrawBackground() const;
+  void DrawHead(const FaceResult& face) const;
+  void DrawStickers(const FaceResult& face, bool opaque) const;
+  void DrawMesh(const GpuMesh& mesh, const FaceResult& face, bool opaque) const;
+  void DrawLandmarks(const FaceResult& face) const;
+
+  EglContext context_;
+  TrackHeader header_;
+  SceneParts parts_;
+  RenderTarget target_;
+  GlProgram solid_;
+  GlProgram dots_;
+  GlProgram ground_;
+  GpuMesh face_;
+  GpuMesh skull_;
+  GpuMesh glasses_;
+  GpuMesh hat_;
+  GpuMesh tripod_;
+  GLuint dot_array_ = 0;
+  GLuint dot_buffer_ = 0;
+  GLuint background_ = 0;  // texture, 0 without
+};
+
+}  // namespace n3ds::tool

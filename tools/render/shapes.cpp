@@ -1,0 +1,113 @@
+#include "render/shapes.h"
+
+#include <cmath>
+
+namespace n3ds::tool {
+namespace {
+
+constexpr float kPi = 3.14159265358979F;
+
+constexpr std::uint16_t kTriangles[][3] = {
+#include "triangles.inc"
+};
+
+constexpr Material kSkin = {{0.80F, 0.74F, 0.69F}, 1, 0.08F};
+
+// A unit sphere, stretched, turned about y and moved: rows of latitude from the lower pole up.
+Mesh Ellipsoid(const std::array<float, 3>& centre, const std::array<float, 3>& half_axes,
+               float turn_about_y) {
+  constexpr std::size_t kRows = 24;
+  constexpr std::size_t kColumns = 48;
+  Mesh mesh;
+  for (std::size_t r = 0; r <= kRows; ++r) {
+    const float latitude = kPi * (static_cast<float>(r) / kRows - 0.5F);
+    for (std::size_t c = 0; c <= kColumns; ++c) {
+      const float longitude = 2 * kPi * static_cast<float>(c) / kColumns;
+      const float x = half_axes[0] * std::cos(latitude) * std::sin(longitude);
+      const float y = half_axes[1] * std::sin(latitude);
+      const float z = half_axes[2] * std::cos(latitude) * std::cos(longitude);
+      const float cosine = std::cos(turn_about_y);
+      const float sine = std::sin(turn_about_y);
+      mesh.vertices.push_back(
+          {{centre[0] + cosine * x + sine * z, centre[1] + y, centre[2] - sine * x + cosine * z},
+           {}});
+    }
+  }
+  for (std::size_t r = 0; r < kRows; ++r) {
+    for (std::size_t c = 0; c < kColumns; ++c) {
+      const auto a = static_cast<std::uint32_t>(r * (kColumns + 1) + c);
+      const auto b = static_cast<std::uint32_t>(a + kColumns + 1);
+      mesh.indices.insert(mesh.indices.end(), {a, a + 1, b + 1, a, b + 1, b});
+    }
+  }
+  ComputeNormals(mesh);
+  mesh.parts.push_back({kSkin, 0, mesh.indices.size()});
+  return mesh;
+}
+
+// An arrow from `start` along axis `axis`: a rod and a cone, each a surface of revolution.
+Mesh Arrow(const std::array<float, 3>& start, std::size_t axis, const Material& material) {
+  constexpr std::uint32_t kSides = 16;
+  // Distance along the axis and radius, mm; a pair of equal distances makes a sharp edge.
+  constexpr float kProfile[][2] = {{0, 0},     {0, 1.6F},  {30, 1.6F}, {30, 1.6F},
+                                   {30, 4.4F}, {30, 4.4F}, {42, 0}};
+  constexpr std::uint32_t kRings = sizeof kProfile / sizeof kProfile[0];
+  Mesh mesh;
+  for (const auto& [along, radius] : kProfile) {
+    for (std::uint32_t s = 0; s < kSides; ++s) {
+      const float angle = 2 * kPi * static_cast<float>(s) / kSides;
+      Vertex vertex;
+      vertex.position = start;
+      vertex.position[axis] += along;
+      vertex.position[(axis + 1) % 3] += radius * std::cos(angle);
+      vertex.position[(axis + 2) % 3] += radius * std::sin(angle);
+      mesh.vertices.push_back(vertex);
+    }
+  }
+  for (std::uint32_t r = 0; r + 1 < kRings; ++r) {
+    for (std::uint32_t s = 0; s < kSides; ++s) {
+      const std::uint32_t a = r * kSides + s;
+      const std::uint32_t b = r * kSides + (s + 1) % kSides;
+      mesh.indices.insert(mesh.indices.end(), {a, b, b + kSides, a, b + kSides, a + kSides});
+    }
+  }
+  ComputeNormals(mesh);
+  mesh.parts.push_back({material, 0, mesh.indices.size()});
+  return mesh;
+}
+
+}  // namespace
+
+Mesh FaceMesh(const FaceModelFile& model) {
+  Mesh mesh;
+  for (const Point3& p : MeanFace(model)) {
+    mesh.vertices.push_back(
+        {{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2])}, {}});
+  }
+  for (const auto& triangle : kTriangles) {
+    mesh.indices.insert(mesh.indices.end(), {triangle[0], triangle[1], triangle[2]});
+  }
+  ComputeNormals(mesh);
+  mesh.parts.push_back({kSkin, 0, mesh.indices.size()});
+  return mesh;
+}
+
+Mesh SkullMesh() {
+  // The ellipsoid passes a millimetre under the forehead of the mean face and has the length and
+  // breadth of an average head; the ears stand off by 25 degrees behind the tragions.
+  Mesh mesh = Ellipsoid({0, 45, -1}, {76, 87, 94}, 0);
+  constexpr float kStandOff = 25 * kPi / 180;
+  Append(Ellipsoid({80, -1, -12}, {4.5F, 28, 16}, -kStandOff), mesh);
+  Append(Ellipsoid({-80, -1, -12}, {4.5F, 28, 16}, kStandOff), mesh);
+  return mesh;
+}
+
+Mesh TripodMesh() {
+  constexpr std::array<float, 3> kStart = {0, -7, 124};
+  Mesh mesh = Arrow(kStart, 0, {{0.85F, 0.15F, 0.12F}, 1, 0.3F});
+  Append(Arrow(kStart, 1, {{0.15F, 0.65F, 0.20F}, 1, 0.3F}), mesh);
+  Append(Arrow(kStart, 2, {{0.15F, 0.30F, 0.85F}, 1, 0.3F}), mesh);
+  return mesh;
+}
+
+}  // namespace n3ds::tool

@@ -1,0 +1,20 @@
+// Meshes made by formula: the head under the stickers and the coordinate tripod.
+#pragma once
+
+#include "engine/face_model_file.h"
+#include "render/mesh.h"
+
+namespace n3ds::tool {
+
+// The mean face of the model in the frame of the model matrix.
+Mesh FaceMesh(const FaceModelFile& model);
+
+// What the face mesh leaves out of a head: skull and ears, fitted to a mean face whose origin lies
+// midway between the tragions. It hides the far sides of hat and glasses; on a photo nothing of it
+// is seen.
+Mesh SkullMesh();
+
+// Three arrows along x (red), y (green) and z (blue) from before the tip of the nose.
+Mesh TripodMesh();
+
+}  // namespace n3ds::tool
