@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""Cuts the landmark tracks of examples/tracks out of longer recordings.
+"""Cuts the landmark tracks of examples/tracks out of longer recordings, and examples/one_face.txt.
 
     tools/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [OUT_FOLDER]
 
@@ -93,6 +93,16 @@ def cut(source, first, end, step, degree, mirror):
     return [header] + frames
 
 
+def as_plain_numbers(lines, frames):
+    """The input of the small example programs: numbers and blanks alone."""
+    header = lines[0]
+    rows = [f"{header['width']} {header['height']} {header['landmarks']}"]
+    for frame in lines[1:1 + frames]:
+        rows.append(str(len(frame["faces"])))
+        rows += [" ".join(map(str, face["points"])) for face in frame["faces"]]
+    return "\n".join(rows) + "\n"
+
+
 def main():
     folders = {"synthetic": pathlib.Path(sys.argv[1]), "real": pathlib.Path(sys.argv[2])}
     out = pathlib.Path(sys.argv[3] if len(sys.argv) > 3 else
@@ -102,6 +112,8 @@ def main():
         lines = cut(folders[folder] / f"{track}.track.jsonl", *how)
         text = "".join(json.dumps(line, separators=(",", ":")) + "\n" for line in lines)
         (out / f"{name}.track.jsonl").write_text(text)
+        if name == "synthetic_natural":
+            (out.parent / "one_face.txt").write_text(as_plain_numbers(lines, 12))
 
 
 if __name__ == "__main__":
