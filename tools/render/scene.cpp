@@ -40,7 +40,7 @@ void main() {
   vec3 to_viewer = normalize(-eye_position);
   float sky = 0.5 + 0.5 * n.y;
   float direct = max(dot(n, to_light), 0.0);
-  float highlight = pow(max(dot(n, normalize(to_light + to_viewer)), 0.0), 40.0) * gloss;
+  float highlight = pow(max(dot(n, normalize(to_light + to_viewer)), 0.0), mix(20.0, 150.0, gloss)) * gloss;
   vec3 lit = colour * (mix(0.30, 0.50, sky) + 0.60 * direct) + vec3(highlight);
   result = vec4(lit, clamp(opacity + highlight, 0.0, 1.0));
 })";
