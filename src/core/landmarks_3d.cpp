@@ -9,6 +9,7 @@
 namespace n3ds {
 
 const int32_t kRidgeVertexIndices[4] = {1335, 1366, 1443, 1513};
+const int32_t kMaskExtraVertexIndices[4] = {893, 979, 1335, 1366};
 
 namespace {
 
