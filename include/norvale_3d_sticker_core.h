@@ -294,7 +294,7 @@ N3DS_API int32_t mcvMatrixMulMatrixColMajor_f32(float* C, const float* A, const 
                                                 int32_t k, int32_t n);
 N3DS_API int32_t mcvMatrixMulMatrixColMajor_s32(int32_t* C, const int32_t* A, const int32_t* B,
                                                 int32_t m, int32_t k, int32_t n);
-/* D = A B + E, the product formed first. */
+/* D = A B + E, the product formed first (zero for k < 1). */
 N3DS_API int32_t mcvMatrixMulAddRowMajor_f32(float* D, const float* A, const float* B,
                                              const float* E, int32_t m, int32_t k, int32_t n);
 N3DS_API int32_t mcvMatrixMulAddRowMajor_s32(int32_t* D, const int32_t* A, const int32_t* B,
@@ -344,13 +344,15 @@ N3DS_API int32_t mcvImgIntegralu8(const uint8_t* src, int32_t width, int32_t hei
 N3DS_API int32_t mcvImgIntegralu8v2(const uint8_t* src, int32_t width, int32_t height,
                                     int32_t srcPitch, uint32_t* sum, int32_t sumPitch,
                                     uint32_t* squareSum);
-/* As v2 with 16-bit sums (wrapping) and a pitch for each output. */
+/* As v2 with 16-bit sums (wrapping) and a pitch for each output, which only counts if the output is
+ * set. */
 N3DS_API int32_t mcvImgIntegralu8v3(const uint8_t* src, int32_t width, int32_t height,
                                     int32_t srcPitch, uint16_t* sum, int32_t sumPitch,
                                     uint32_t* squareSum, int32_t squareSumPitch);
 /* Splits packed Y0 U Y1 V into a luma plane and a chroma plane of the same size (U at even, V at
  * odd columns; every row kept). Source rows are 2 width bytes, output rows width bytes, each
- * rounded up to a multiple of 4. Returns 0; -1 null. */
+ * rounded up to a multiple of 4. An odd width writes one byte of padding per row, the second half
+ * of its last pair. Returns 0; -1 null. */
 N3DS_API int32_t mcvYUYVToOrgData(const uint8_t* src, int32_t width, int32_t height,
                                   uint8_t* lumaDst, uint8_t* chromaDst);
 
