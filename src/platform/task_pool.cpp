@@ -72,7 +72,7 @@ void JoinAndFree(TaskPool* pool) {
   pthread_cond_broadcast(&pool->taskReady);
   for (uint32_t i = 0; i < pool->threadCount; ++i) pthread_join(pool->threads[i], nullptr);
 
-  const MHandle memory = pool->memory;
+  MHandle memory = pool->memory;
   mcvMemFree(memory, pool->threads);
   pthread_mutex_destroy(&pool->queueLock);
   pthread_mutex_destroy(&pool->doneLock);

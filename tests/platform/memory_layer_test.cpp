@@ -76,7 +76,7 @@ class Pool {
 
 TEST(MemoryPool, FreshPoolIsOneFreeBlockAndTheEndMarker) {
   alignas(8) unsigned char area[128];
-  const MHandle pool = MMemMgrCreate(area, sizeof(area));
+  MHandle pool = MMemMgrCreate(area, sizeof(area));
   ASSERT_EQ(pool, area);
   EXPECT_THAT(ReadChain(pool), ElementsAre(Free(96)));
   uint64_t end[2];
@@ -87,7 +87,7 @@ TEST(MemoryPool, FreshPoolIsOneFreeBlockAndTheEndMarker) {
 
 TEST(MemoryPool, AreaIsCutToMultiplesOfEight) {
   alignas(8) unsigned char area[136];
-  const MHandle pool = MMemMgrCreate(area + 3, 132);  // 5 bytes skipped, 127 left, 120 usable
+  MHandle pool = MMemMgrCreate(area + 3, 132);  // 5 bytes skipped, 127 left, 120 usable
   ASSERT_EQ(pool, area + 8);
   EXPECT_THAT(ReadChain(pool), ElementsAre(Free(88)));
 }
@@ -245,6 +245,13 @@ TEST(MemoryPool, LargestFreeBlockIsReported) {
   EXPECT_EQ(GetMaxAllocMemSize(pool.handle()), 512u - 128 - 8 - 32);
   ASSERT_NE(pool.Alloc(512 - 128 - 8 - 32), nullptr);
   EXPECT_EQ(GetMaxAllocMemSize(pool.handle()), 128u);
+
+  Pool other(256);  // the larger of two free blocks first
+  a = other.Alloc(128);
+  other.Alloc(8);
+  other.Free(a);
+  EXPECT_THAT(other.Chain(), ElementsAre(Free(128), Used(8), Free(88)));
+  EXPECT_EQ(GetMaxAllocMemSize(other.handle()), 128u);
 }
 
 TEST(MemoryPool, ReallocOfNullAllocates) {

@@ -421,7 +421,7 @@ TEST_F(TaskPoolTest, NullArguments) {
 
 TEST_F(TaskPoolTest, TakesItsMemoryFromTheHandleAndGivesAllBack) {
   std::vector<uint64_t> area(1024);
-  const MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
+  MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
   const size_t before = GetMaxAllocMemSize(memory);
   void* pool = mcvParallelInit(memory, 3);
   ASSERT_NE(pool, nullptr);
@@ -437,7 +437,7 @@ TEST_F(TaskPoolTest, ExhaustedMemoryGivesNullAndLeavesNothingBehind) {
   bool succeeded = false;
   for (size_t bytes = 40; !succeeded; bytes += 8) {
     ASSERT_LT(bytes, area.size() * 8);
-    const MHandle memory = MMemMgrCreate(area.data(), bytes);
+    MHandle memory = MMemMgrCreate(area.data(), bytes);
     const size_t before = GetMaxAllocMemSize(memory);
     threads_created = threads_joined = 0;
     void* pool = mcvParallelInit(memory, 3);
@@ -455,7 +455,7 @@ TEST_F(TaskPoolTest, ExhaustedMemoryGivesNullAndLeavesNothingBehind) {
 
 TEST_F(TaskPoolTest, RefusedThreadGivesNullAndLeavesNothingBehind) {
   std::vector<uint64_t> area(1024);
-  const MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
+  MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
   const size_t before = GetMaxAllocMemSize(memory);
   for (int refused = 0; refused < 4; ++refused) {
     create_calls_until_refusal = refused;
@@ -469,7 +469,7 @@ TEST_F(TaskPoolTest, RefusedThreadGivesNullAndLeavesNothingBehind) {
 
 TEST_F(TaskPoolTest, PoolMemoryFunctionsAreThoseOfTheMemoryLayer) {
   alignas(8) unsigned char area[128];
-  const MHandle memory = MMemMgrCreate(area, sizeof(area));
+  MHandle memory = MMemMgrCreate(area, sizeof(area));
   void* p = mcvMemAlloc(memory, 8);
   EXPECT_EQ(p, area + 16);
   mcvMemFree(memory, p);
