@@ -206,9 +206,10 @@ void Scene::DrawMesh(const GpuMesh& mesh, const FaceResult& face, bool opaque) c
 
 void Scene::DrawLandmarks(const FaceResult& face) const {
   SetMatrices(dots_, face);
-  // Large enough to be seen, small enough that lids and lips stay apart.
-  const double scale = static_cast<double>(target_.width()) / header_.upright_width();
-  glUniform1f(dots_.Uniform("size"), static_cast<float>(std::clamp(3.0 * scale, 2.5, 5.0)));
+  // In proportion to the face, so that lids and lips stay apart: 150 mm is a head's breadth.
+  const double depth = -ModelView(face)[14];
+  const double breadth = 150 / depth * face.projection[0] / 2 * target_.width();
+  glUniform1f(dots_.Uniform("size"), static_cast<float>(std::clamp(0.018 * breadth, 1.5, 6.0)));
   glBindVertexArray(dot_array_);
   glBindBuffer(GL_ARRAY_BUFFER, dot_buffer_);
   glBufferData(GL_ARRAY_BUFFER, static_cast<GLsizeiptr>(face.landmarks3d.size() * sizeof(float)),

@@ -18,19 +18,26 @@ Mesh Ellipsoid(const std::array<float, 3>& centre, const std::array<float, 3>& h
                float turn_about_y) {
   constexpr std::size_t kRows = 24;
   constexpr std::size_t kColumns = 48;
+  const float cosine = std::cos(turn_about_y);
+  const float sine = std::sin(turn_about_y);
+  const auto turned = [&](float x, float y, float z) -> std::array<float, 3> {
+    return {cosine * x + sine * z, y, cosine * z - sine * x};
+  };
   Mesh mesh;
   for (std::size_t r = 0; r <= kRows; ++r) {
     const float latitude = kPi * (static_cast<float>(r) / kRows - 0.5F);
     for (std::size_t c = 0; c <= kColumns; ++c) {
       const float longitude = 2 * kPi * static_cast<float>(c) / kColumns;
-      const float x = half_axes[0] * std::cos(latitude) * std::sin(longitude);
-      const float y = half_axes[1] * std::sin(latitude);
-      const float z = half_axes[2] * std::cos(latitude) * std::cos(longitude);
-      const float cosine = std::cos(turn_about_y);
-      const float sine = std::sin(turn_about_y);
-      mesh.vertices.push_back(
-          {{centre[0] + cosine * x + sine * z, centre[1] + y, centre[2] - sine * x + cosine * z},
-           {}});
+      const float x = std::cos(latitude) * std::sin(longitude);
+      const float y = std::sin(latitude);
+      const float z = std::cos(latitude) * std::cos(longitude);
+      Vertex vertex;
+      vertex.position = turned(half_axes[0] * x, half_axes[1] * y, half_axes[2] * z);
+      for (std::size_t k = 0; k < 3; ++k) vertex.position[k] += centre[k];
+      vertex.normal = turned(x / half_axes[0], y / half_axes[1], z / half_axes[2]);
+      const float length = std::hypot(vertex.normal[0], vertex.normal[1], vertex.normal[2]);
+      for (float& value : vertex.normal) value /= length;
+      mesh.vertices.push_back(vertex);
     }
   }
   for (std::size_t r = 0; r < kRows; ++r) {
@@ -40,7 +47,6 @@ Mesh Ellipsoid(const std::array<float, 3>& centre, const std::array<float, 3>& h
       mesh.indices.insert(mesh.indices.end(), {a, a + 1, b + 1, a, b + 1, b});
     }
   }
-  ComputeNormals(mesh);
   mesh.parts.push_back({kSkin, 0, mesh.indices.size()});
   return mesh;
 }

@@ -18,6 +18,11 @@ namespace n3ds::tool {
 
 VideoWriter::VideoWriter(const std::string& path, int width, int height, double fps)
     : path_(path, ".mp4") {
+  // A place that cannot be written to is named here; ffmpeg would say it in words of its own.
+  std::FILE* probe = std::fopen(path_.temporary().c_str(), "wb");
+  if (probe == nullptr) throw Error(path + ": cannot be written (" + std::strerror(errno) + ")");
+  std::fclose(probe);
+
   // The encoder may die while it is written to; that must become an error, not the end of n3ds.
   std::signal(SIGPIPE, SIG_IGN);
   int ends[2];
@@ -29,7 +34,7 @@ VideoWriter::VideoWriter(const std::string& path, int width, int height, double 
   std::array<const char*, 25> arguments = {"ffmpeg",
                                            "-y",
                                            "-loglevel",
-                                           "error",
+                                           "fatal",
                                            "-f",
                                            "rawvideo",
                                            "-pix_fmt",

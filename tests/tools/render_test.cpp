@@ -1,0 +1,372 @@
+// Pictures, meshes and the scene.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <numeric>
+
+#include "engine/engine_session.h"
+#include "render/contact_sheet.h"
+#include "render/obj_file.h"
+#include "render/picture.h"
+#include "render/scene.h"
+#include "render/shapes.h"
+#include "scratch_folder.h"
+#include "tracks/upright.h"
+
+namespace n3ds::tool {
+namespace {
+
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+
+Picture Pattern(int width, int height) {
+  Picture picture(width, height);
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
+      std::uint8_t* pixel = picture.Pixel(x, y);
+      pixel[0] = static_cast<std::uint8_t>(37 * x + 11);
+      pixel[1] = static_cast<std::uint8_t>(59 * y + 7);
+      pixel[2] = static_cast<std::uint8_t>(x * y);
+    }
+  }
+  return picture;
+}
+
+template <typename Function>
+std::string Message(Function function) {
+  try {
+    function();
+  } catch (const Error& error) {
+    return error.what();
+  }
+  return "";
+}
+
+TEST(Picture, PngReadsBack) {
+  const ScratchFolder folder;
+  const Picture picture = Pattern(7, 5);
+  WritePng(folder.Path("a.png"), picture);
+  const Picture again = ReadPicture(folder.Path("a.png"));
+  EXPECT_EQ(again.width, 7);
+  EXPECT_EQ(again.height, 5);
+  EXPECT_EQ(again.rgba, picture.rgba);
+  EXPECT_THAT(folder.Names(), ElementsAre("a.png"));
+}
+
+TEST(Picture, RefusesWhatIsNoWholePicture) {
+  const ScratchFolder folder;
+  WritePng(folder.Path("a.png"), Pattern(40, 30));
+  const std::string bytes = folder.Read("a.png");
+  const auto refusal = [&](const std::string& content) {
+    const std::string path = folder.Write("b.png", content);
+    return Message([&] { ReadPicture(path); });
+  };
+  EXPECT_THAT(refusal(bytes.substr(0, bytes.size() / 2)), HasSubstr("not a whole PNG file"));
+  EXPECT_THAT(refusal(bytes.substr(0, 20)), HasSubstr("not a whole PNG file"));
+  EXPECT_THAT(refusal("\xff\xd8 nothing"), HasSubstr("not a whole JPEG file"));
+  EXPECT_THAT(refusal("GIF89a"), HasSubstr("neither a PNG nor a JPEG"));
+  EXPECT_THAT(refusal(""), HasSubstr("cannot be read"));
+  EXPECT_THAT(Message([&] { ReadPicture(folder.Path("none.png")); }),
+              HasSubstr("cannot be opened"));
+}
+
+// The middle of each pixel goes where a landmark on it goes.
+TEST(Picture, TurnsLikeTheLandmarks) {
+  const Picture delivered = Pattern(9, 6);
+  for (const int degree : {0, 90, 180, 270}) {
+    for (const int mirror : {0, 1}) {
+      TrackHeader header;
+      header.width = delivered.width;
+      header.height = delivered.height;
+      header.degree = degree;
+      header.mirror = mirror;
+      const Picture upright = Upright(delivered, degree, mirror == 1);
+      EXPECT_EQ(upright.width, header.upright_width());
+      EXPECT_EQ(upright.height, header.upright_height());
+      for (int y = 0; y < delivered.height; ++y) {
+        for (int x = 0; x < delivered.width; ++x) {
+          const PixelPoint p = ToUpright(header, x + 0.5, y + 0.5);
+          const std::uint8_t* moved =
+              upright.Pixel(static_cast<int>(p.x - 0.5), static_cast<int>(p.y - 0.5));
+          EXPECT_EQ(moved[0], delivered.Pixel(x, y)[0]);
+          EXPECT_EQ(moved[1], delivered.Pixel(x, y)[1]);
+        }
+      }
+    }
+  }
+}
+
+TEST(ContactSheet, ChoosesEvenlySpacedFrames) {
+  EXPECT_THAT(EvenlySpaced(300, 4), ElementsAre(0, 100, 199, 299));
+  EXPECT_THAT(EvenlySpaced(3, 12), ElementsAre(0, 1, 2));
+  EXPECT_THAT(EvenlySpaced(100, 1), ElementsAre(0));
+}
+
+TEST(ContactSheet, LaysTilesOutInAGrid) {
+  ContactSheet sheet(12, 160, 90);
+  for (int i = 0; i < 12; ++i) sheet.Add(Pattern(160, 90), 25 * i);
+  EXPECT_GE(sheet.picture().width, 3 * 160);
+  EXPECT_GE(sheet.picture().height, 2 * 90);
+  EXPECT_EQ((sheet.picture().width + 4) % 164, 0);
+  EXPECT_EQ((sheet.picture().height + 4) % 94, 0);
+}
+
+TEST(ObjFile, ReadsPartsWithMaterials) {
+  const ScratchFolder folder;
+  folder.Write("m.mtl", "newmtl red\nKd 1 0 0\nd 0.5\nNs 50\nnewmtl blue\nKd 0 0 1\n");
+  const Mesh mesh = ReadObj(folder.Write("a.obj",
+                                         "# a square and a triangle\nmtllib m.mtl\n"
+                                         "v 0 0 0\nv 1 0 0\nv 1 1 0\nv 0 1 0\nvn 0 0 1\n"
+                                         "usemtl red\nf 1//1 2//1 3//1 4//1\n"
+                                         "usemtl blue\nf 1/7/1 2/7/1 3/7/1\n"));
+  ASSERT_EQ(mesh.parts.size(), 2u);
+  EXPECT_EQ(mesh.parts[0].index_count, 6u);
+  EXPECT_EQ(mesh.parts[0].material.opacity, 0.5F);
+  EXPECT_EQ(mesh.parts[0].material.gloss, 0.5F);
+  EXPECT_EQ(mesh.parts[1].first_index, 6u);
+  EXPECT_EQ(mesh.parts[1].material.colour[2], 1.0F);
+  EXPECT_EQ(mesh.vertices[mesh.indices[5]].position, (std::array<float, 3>{0, 1, 0}));
+}
+
+TEST(ObjFile, NamesTheLineOfAMistake) {
+  const ScratchFolder folder;
+  const auto refusal = [&](const std::string& text) {
+    const std::string path = folder.Write("a.obj", text);
+    return Message([&] { ReadObj(path); });
+  };
+  EXPECT_THAT(refusal("v 0 0 0\nv 1 x 0\n"), HasSubstr("a.obj:2: three numbers are needed"));
+  EXPECT_THAT(refusal("v 0 0 0\nvn 0 0 1\nf 1//1 1//1\n"), HasSubstr(":3: a face has fewer"));
+  EXPECT_THAT(refusal("v 0 0 0\nvn 0 0 1\nf 1//1 2//1 1//1\n"),
+              HasSubstr(":3: there is no entry 2"));
+  EXPECT_THAT(refusal("v 0 0 0\nvn 0 0 1\nf 1//1 -1//1 1//1\n"),
+              HasSubstr(":3: there is no entry"));
+  EXPECT_THAT(refusal("v 0 0 0\nf 1 1 1\n"), HasSubstr(":2: corner 1 has no normal"));
+  EXPECT_THAT(refusal("usemtl gold\n"), HasSubstr(":1: there is no material gold"));
+  EXPECT_THAT(refusal("mtllib none.mtl\n"), HasSubstr("none.mtl: cannot be opened"));
+  EXPECT_THAT(refusal(""), HasSubstr("there is no face in it"));
+}
+
+double Length(const std::array<float, 3>& v) {
+  return std::sqrt(std::inner_product(v.begin(), v.end(), v.begin(), 0.0));
+}
+
+TEST(Assets, AreSoundMeshesThatFitTheHead) {
+  for (const char* name : {"glasses", "hat"}) {
+    const Mesh mesh = ReadObj(std::string(N3DS_SOURCE_DIR "/examples/assets/") + name + ".obj");
+    for (const Vertex& vertex : mesh.vertices) {
+      EXPECT_NEAR(Length(vertex.normal), 1, 0.02) << name;
+      EXPECT_LT(std::abs(vertex.position[0]), 150) << name;
+    }
+    std::size_t covered = 0;
+    for (const MeshPart& part : mesh.parts) {
+      EXPECT_EQ(part.first_index, covered);
+      covered += part.index_count;
+    }
+    EXPECT_EQ(covered, mesh.indices.size());
+  }
+}
+
+// The frame and the lenses must not cut into the face where the eyes are.
+TEST(Assets, GlassesStandBeforeTheFace) {
+  const Mesh glasses = ReadObj(N3DS_SOURCE_DIR "/examples/assets/glasses.obj");
+  const Mesh face = FaceMesh(ReadFaceModelFile(N3DS_SOURCE_DIR "/data/face_model.bin"));
+  for (const Vertex& vertex : glasses.vertices) {
+    const auto& p = vertex.position;
+    if (std::abs(p[0]) < 14 || std::abs(p[0]) > 58) continue;  // nose pads and temples
+    for (const Vertex& skin : face.vertices) {
+      const double distance = std::hypot(skin.position[0] - p[0], skin.position[1] - p[1]);
+      if (distance > 3) continue;
+      EXPECT_GT(p[2], skin.position[2]) << p[0] << " " << p[1];
+    }
+  }
+}
+
+TEST(Shapes, SurfacesFaceOutwards) {
+  const Mesh face = FaceMesh(ReadFaceModelFile(N3DS_SOURCE_DIR "/data/face_model.bin"));
+  double forward = 0;
+  for (const Vertex& vertex : face.vertices) forward += vertex.normal[2];
+  EXPECT_GT(forward / static_cast<double>(face.vertices.size()), 0.3);
+
+  const Mesh skull = SkullMesh();
+  for (std::size_t i = 0; i < skull.parts[0].index_count; ++i) {
+    const Vertex& vertex = skull.vertices[skull.indices[i]];
+    const double out = vertex.normal[0] * vertex.position[0] +
+                       vertex.normal[1] * (vertex.position[1] - 45) +
+                       vertex.normal[2] * (vertex.position[2] + 1);
+    EXPECT_GT(out, 0);
+  }
+}
+
+TEST(Shapes, SkullLiesUnderTheForehead) {
+  const Mesh face = FaceMesh(ReadFaceModelFile(N3DS_SOURCE_DIR "/data/face_model.bin"));
+  for (const Vertex& vertex : face.vertices) {
+    const auto& p = vertex.position;
+    if (p[1] < 55 || p[2] < 60) continue;
+    const double x = p[0] / 76;
+    const double y = (p[1] - 45) / 87;
+    const double z = (p[2] + 1) / 94;
+    EXPECT_GT(x * x + y * y + z * z, 0.97) << p[0] << " " << p[1] << " " << p[2];
+  }
+}
+
+// What a part of the scene adds to the picture: its pixels' bounding box.
+struct Extent {
+  int left = 1 << 20;
+  int top = 1 << 20;
+  int right = -1;
+  int bottom = -1;
+  int pixels = 0;
+};
+
+Extent Difference(const Picture& a, const Picture& b) {
+  Extent extent;
+  for (int y = 0; y < a.height; ++y) {
+    for (int x = 0; x < a.width; ++x) {
+      if (std::equal(a.Pixel(x, y), a.Pixel(x, y) + 3, b.Pixel(x, y))) continue;
+      extent.left = std::min(extent.left, x);
+      extent.right = std::max(extent.right, x);
+      extent.top = std::min(extent.top, y);
+      extent.bottom = std::max(extent.bottom, y);
+      ++extent.pixels;
+    }
+  }
+  return extent;
+}
+
+// A frontal head 700 mm before the camera of a 640 x 480 picture, its middle at (400, 200).
+FrameResult FrontalHead() {
+  const float focal = 560;
+  FaceResult face;
+  face.projection = {
+      2 * focal / 640,  0, 0, 0, 0, 2 * focal / 480, 0, 0, 0, 0, -5001.0F / 4999, -1, 0, 0,
+      -10000.0F / 4999, 0};
+  face.view = {1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, 0, 0, -500, 1};
+  face.model = {1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, 100, 50, -200, 1};
+  FrameResult frame;
+  frame.ok = true;
+  frame.faces.push_back(face);
+  return frame;
+}
+
+TrackHeader SmallHeader() {
+  TrackHeader header;
+  header.width = 640;
+  header.height = 480;
+  header.fps = 30;
+  header.landmarks = 101;
+  return header;
+}
+
+Picture DrawParts(const FrameResult& frame, const SceneParts& parts) {
+  Scene scene(SmallHeader(), DefaultModelPath(), parts, std::nullopt, 640, 480);
+  return scene.Draw(frame);
+}
+
+constexpr SceneParts kNothing = {false, false, false, false, false};
+
+// Where the vertices of an asset lie in the picture, as continuous pixel coordinates.
+struct Outline {
+  double left = 1e9;
+  double top = 1e9;
+  double right = -1e9;
+  double bottom = -1e9;
+};
+
+Outline Projected(const char* asset, const FaceResult& face) {
+  Outline outline;
+  for (const Vertex& vertex :
+       ReadObj(std::string(N3DS_SOURCE_DIR "/examples/assets/") + asset + ".obj").vertices) {
+    const auto& v = vertex.position;
+    const PixelPoint p = ProjectToPixel(face, SmallHeader(), v[0], v[1], v[2]);
+    outline.left = std::min(outline.left, p.x);
+    outline.right = std::max(outline.right, p.x);
+    outline.top = std::min(outline.top, p.y);
+    outline.bottom = std::max(outline.bottom, p.y);
+  }
+  return outline;
+}
+
+TEST(Scene, DrawsStickersWhereTheMatricesSay) {
+  constexpr double kPixels = 1.5;
+  const FrameResult frame = FrontalHead();
+  const Picture empty = DrawParts(frame, kNothing);
+  SceneParts parts = kNothing;
+  parts.hat = true;
+  const Extent hat = Difference(empty, DrawParts(frame, parts));
+  const Outline expected_hat = Projected("hat", frame.faces[0]);
+  EXPECT_NEAR(hat.left, expected_hat.left, kPixels);
+  EXPECT_NEAR(hat.right, expected_hat.right, kPixels);
+  EXPECT_NEAR(hat.top, expected_hat.top, kPixels);
+
+  // The temples are hidden in part, the rims are not.
+  parts = kNothing;
+  parts.glasses = true;
+  const Extent glasses = Difference(empty, DrawParts(frame, parts));
+  const Outline expected_glasses = Projected("glasses", frame.faces[0]);
+  EXPECT_NEAR(glasses.top, expected_glasses.top, kPixels);
+  EXPECT_GE(glasses.left, expected_glasses.left - kPixels);
+  EXPECT_LE(glasses.right, expected_glasses.right + kPixels);
+  EXPECT_GT(glasses.top, hat.top);
+}
+
+TEST(Scene, ThePlainPictureIsTheBackground) {
+  Picture photo = Pattern(640, 480);
+  Scene scene(SmallHeader(), DefaultModelPath(), kNothing, photo, 640, 480);
+  const Picture drawn = scene.Draw(FrontalHead());
+  EXPECT_EQ(drawn.rgba, photo.rgba);
+}
+
+TEST(Scene, TheHeadHidesWhatIsBehindIt) {
+  // Seen from behind, glasses are hidden but for the ends of the temples.
+  FrameResult frame = FrontalHead();
+  const Extent before = [&] {
+    SceneParts parts = kNothing;
+    const Picture empty = DrawParts(frame, parts);
+    parts.glasses = true;
+    return Difference(empty, DrawParts(frame, parts));
+  }();
+  Matrix4& model = frame.faces[0].model;
+  model[0] = -1;
+  model[10] = -1;
+  SceneParts parts = kNothing;
+  const Picture empty = DrawParts(frame, parts);
+  parts.glasses = true;
+  const Extent behind = Difference(empty, DrawParts(frame, parts));
+  EXPECT_LT(behind.pixels, before.pixels / 8);
+}
+
+TEST(Scene, NearerHeadsHideFartherOnes) {
+  FrameResult frame = FrontalHead();
+  FaceResult far = frame.faces[0];
+  far.model[14] = -800;  // 1300 mm away, behind the other in the picture
+  far.model[12] = 100.0F * 1300 / 700;
+  far.model[13] = 50.0F * 1300 / 700;
+  SceneParts parts = kNothing;
+  parts.head = true;
+  const Picture near_alone = DrawParts(frame, parts);
+  frame.faces.insert(frame.faces.begin(), far);
+  const Extent added = Difference(near_alone, DrawParts(frame, parts));
+  EXPECT_LT(added.pixels, 50);
+}
+
+TEST(Scene, LeavesOutFacesWithoutAPose) {
+  FrameResult frame = FrontalHead();
+  const SceneParts parts;
+  const Picture empty = DrawParts({}, parts);
+  frame.faces[0].model[12] = std::numeric_limits<float>::quiet_NaN();
+  EXPECT_EQ(DrawParts(frame, parts).rgba, empty.rgba);
+}
+
+TEST(Scene, DrawsTheSamePictureTwice) {
+  const FrameResult frame = FrontalHead();
+  const SceneParts parts;
+  Scene scene(SmallHeader(), DefaultModelPath(), parts, std::nullopt, 320, 240);
+  const Picture first = scene.Draw(frame);
+  EXPECT_EQ(scene.Draw(frame).rgba, first.rgba);
+}
+
+}  // namespace
+}  // namespace n3ds::tool
