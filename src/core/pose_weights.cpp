@@ -118,6 +118,10 @@ int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights) {
   return N3DS_OK;
 }
 
+bool AllowsIdentityFit(const PoseWeights& weights) {
+  return weights.mouth_open == 0 && weights.frontal == 1 && weights.weighting_switch == 1;
+}
+
 float ClampInnerWeight(float weight) {
   if (static_cast<double>(weight) < 0.1) return 0.1f;
   return weight > 10.0f ? 10.0f : weight;

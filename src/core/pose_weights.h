@@ -19,6 +19,9 @@ struct PoseWeights {
 // below 1e-6 it returns 0 and leaves what would have followed as it was.
 int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights);
 
+// Whether the frame may refine the person's identity: mouth shut, frontal, undistorted.
+bool AllowsIdentityFit(const PoseWeights& weights);
+
 // w3 as the pose fits take it: within [0.1, 10].
 float ClampInnerWeight(float weight);
 

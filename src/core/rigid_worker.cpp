@@ -76,7 +76,7 @@ void FinishFace(const RigidFaceTask& task, const PoseRounds& rounds) {
 }
 
 void RefineShape(const RigidFaceTask& task, const PoseWeights& weights, PoseRounds* rounds) {
-  if (weights.mouth_open == 0 && weights.frontal == 1 && weights.weighting_switch == 1) {
+  if (AllowsIdentityFit(weights)) {
     RefitIdentityRigid(task.memory, task.landmarks, task.meanShape, task.identityBasis, task.camera,
                        rounds->rotation(), rounds->translation(), rounds->landmark_vertices(),
                        task.scale, task.identityCoef);
