@@ -16,8 +16,6 @@
 #include "render/picture.h"
 #include "scratch_folder.h"
 
-extern char** environ;
-
 namespace n3ds::tool {
 namespace {
 

@@ -85,7 +85,7 @@ void AddEvalCommand(CLI::App& app) {
       "\nThe last line gives the constant offset between the truth's head frame and the\n"
       "engine's that was taken off, estimated over all tracks together.\n"
       "Examples:\n"
-      "  n3ds eval examples/tracks/yaw_sweep.track.jsonl\n"
+      "  n3ds eval examples/tracks/synthetic_yaw_sweep.track.jsonl\n"
       "  n3ds eval *.track.jsonl --csv scores.csv");
   command->callback([options] { RunEvalCommand(*options); });
 }

@@ -13,17 +13,16 @@ namespace {
 constexpr int kExitFailed = 1;
 constexpr int kExitUsage = 2;
 
-}  // namespace
-
-int main(int argc, char** argv) {
+// Exit code of the program; throws what is wrong with the files.
+int Run(int argc, char** argv) {
   CLI::App app("Runs landmark tracks through the Norvale 3-D sticker engine.", "n3ds");
   app.set_version_flag("--version", Norvale_3DSticker_GetVersion()->versionText);
   app.require_subcommand(1);
   app.footer(
       "Examples:\n"
-      "  n3ds track talk.track.jsonl --out talk.results.jsonl\n"
+      "  n3ds track examples/tracks/real_expressions.track.jsonl --out results.jsonl\n"
       "  n3ds eval examples/tracks/synthetic_*.track.jsonl\n"
-      "  n3ds render talk.track.jsonl --out talk.mp4\n"
+      "  n3ds render examples/tracks/real_two_people.track.jsonl --out two.mp4\n"
       "  n3ds model info data/face_model.bin\n"
       "'n3ds COMMAND --help' says more. The track format is described in\n"
       "examples/tracks/README.md.");
@@ -38,9 +37,17 @@ int main(int argc, char** argv) {
     if (error.get_exit_code() == 0) return app.exit(error);
     std::fprintf(stderr, "n3ds: %s (--help shows how)\n", error.what());
     return kExitUsage;
+  }
+  return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  try {
+    return Run(argc, argv);
   } catch (const std::exception& error) {
     std::fprintf(stderr, "n3ds: %s\n", error.what());
     return kExitFailed;
   }
-  return 0;
 }

@@ -108,7 +108,7 @@ void AddTrackCommand(CLI::App& app) {
       "with faces and the distance between the landmarks handed in and the 3-D landmarks as the\n"
       "matrices draw them. The exit code is 1 when a frame failed.\n"
       "Examples:\n"
-      "  n3ds track examples/tracks/talk_165.track.jsonl\n"
+      "  n3ds track examples/tracks/synthetic_talk_165.track.jsonl\n"
       "  n3ds track talk.track.jsonl --out talk.results.jsonl --model my_model.bin");
   command->callback([options] { RunTrackCommand(*options); });
 }

@@ -38,10 +38,8 @@ PixelPoint ProjectToPixel(const FaceResult& face, const TrackHeader& header, dou
   for (std::size_t row = 0; row < 4; ++row) {
     for (std::size_t k = 0; k < 4; ++k) clip[row] += double{face.projection[4 * k + row]} * eye[k];
   }
-  const double even_width = header.upright_width() / 2 * 2;
-  const double even_height = header.upright_height() / 2 * 2;
-  return {(clip[0] / clip[3] + 1) / 2 * even_width - 0.5,
-          (1 - clip[1] / clip[3]) / 2 * even_height - 0.5};
+  return {(clip[0] / clip[3] + 1) / 2 * ViewportSize(header.upright_width()) - 0.5,
+          (1 - clip[1] / clip[3]) / 2 * ViewportSize(header.upright_height()) - 0.5};
 }
 
 }  // namespace n3ds::tool

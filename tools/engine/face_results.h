@@ -34,10 +34,13 @@ std::array<double, 16> ModelView(const FaceResult& face);
 // Every number of the matrices and landmarks is finite.
 bool IsFinite(const FaceResult& face);
 
+// The engine's matrices are made for a viewport of even size; an odd last row or column of the
+// picture lies outside of it.
+inline int ViewportSize(int picture_size) { return picture_size - picture_size % 2; }
+
 // Where a renderer that uses nothing but the three matrices puts a point of the model frame, in
 // pixels of the upright picture as the landmarks count them: landmark x stands for the centre of
-// pixel column x, so half a pixel is taken off. The engine's matrices are made for a viewport of
-// even size: an odd last row or column lies outside.
+// pixel column x, so half a pixel is taken off.
 PixelPoint ProjectToPixel(const FaceResult& face, const TrackHeader& header, double x, double y,
                           double z);
 

@@ -4,6 +4,14 @@
 #include <cstdint>
 
 namespace n3ds::tool {
+namespace {
+
+// OpenGL takes a place in the bound buffer as a pointer.
+const void* BufferOffset(std::size_t bytes) {
+  return reinterpret_cast<const void*>(bytes);  // NOLINT(performance-no-int-to-ptr)
+}
+
+}  // namespace
 
 GpuMesh::GpuMesh(const Mesh& mesh) : parts_(mesh.parts) {
   glGenVertexArrays(1, &array_);
@@ -20,7 +28,7 @@ GpuMesh::GpuMesh(const Mesh& mesh) : parts_(mesh.parts) {
   glVertexAttribPointer(0, 3, GL_FLOAT, GL_FALSE, sizeof(Vertex), nullptr);
   glEnableVertexAttribArray(1);
   glVertexAttribPointer(1, 3, GL_FLOAT, GL_FALSE, sizeof(Vertex),
-                        reinterpret_cast<const void*>(offsetof(Vertex, normal)));
+                        BufferOffset(offsetof(Vertex, normal)));
   glBindVertexArray(0);
 }
 
@@ -32,7 +40,7 @@ GpuMesh::~GpuMesh() {
 void GpuMesh::DrawPart(const MeshPart& part) const {
   glBindVertexArray(array_);
   glDrawElements(GL_TRIANGLES, static_cast<GLsizei>(part.index_count), GL_UNSIGNED_INT,
-                 reinterpret_cast<const void*>(part.first_index * sizeof(std::uint32_t)));
+                 BufferOffset(part.first_index * sizeof(std::uint32_t)));
 }
 
 }  // namespace n3ds::tool

@@ -140,13 +140,12 @@ Picture Scene::Draw(const FrameResult& frame) {
   glClear(GL_DEPTH_BUFFER_BIT);
   DrawBackground();
 
-  // The matrices are made for a viewport of even size; an odd last column or row lies outside of
-  // it.
-  const auto even_share = [](int size) { return static_cast<double>(size / 2 * 2) / size; };
-  const auto width =
-      static_cast<GLsizei>(std::lround(target_.width() * even_share(header_.upright_width())));
-  const auto height =
-      static_cast<GLsizei>(std::lround(target_.height() * even_share(header_.upright_height())));
+  const auto viewport = [](int target, int upright) {
+    return static_cast<GLsizei>(
+        std::lround(static_cast<double>(target) * ViewportSize(upright) / upright));
+  };
+  const GLsizei width = viewport(target_.width(), header_.upright_width());
+  const GLsizei height = viewport(target_.height(), header_.upright_height());
   glViewport(0, target_.height() - height, width, height);
 
   std::vector<const FaceResult*> faces;

@@ -12,8 +12,6 @@
 
 #include "support/error.h"
 
-extern char** environ;
-
 namespace n3ds::tool {
 
 VideoWriter::VideoWriter(const std::string& path, int width, int height, double fps)
