@@ -46,6 +46,16 @@ MRESULT Norvale_3DSticker_Process(void* engine, NSVL_OFFSCREEN* image, uint32_t 
   return EngineOf(engine)->ProcessFace(image, nFaces, nLandmarks, points, rects, extra, out);
 }
 
+MRESULT Norvale_3DSticker_Process_FaceMask(void* engine, NSVL_OFFSCREEN* image, uint32_t nFaces,
+                                           uint32_t nLandmarks, __tag_point* points,
+                                           __tag_rect* rects, float* extra,
+                                           Norvale_3DSticker_Matrix_Array* matrices,
+                                           Norvale_3DSticker_ModelInfo_Array* models) {
+  if (engine == nullptr) return N3DS_NULL_ENGINE;
+  return EngineOf(engine)->ProcessFaceMask(image, nFaces, nLandmarks, points, rects, extra,
+                                           matrices, models);
+}
+
 const Norvale_3DSticker_Version* Norvale_3DSticker_GetVersion(void) {
   return CNorvaleFaceShapeImp::GetVersion();
 }

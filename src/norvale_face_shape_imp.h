@@ -22,6 +22,10 @@ class CNorvaleFaceShapeImp {
   MRESULT ProcessFace(NSVL_OFFSCREEN* image, unsigned int nFaces, unsigned int nLandmarks,
                       __tag_point* points, __tag_rect* rects, float* extra,
                       Norvale_3DSticker_Matrix_Array* out);
+  MRESULT ProcessFaceMask(NSVL_OFFSCREEN* image, unsigned int nFaces, unsigned int nLandmarks,
+                          __tag_point* points, __tag_rect* rects, float* extra,
+                          Norvale_3DSticker_Matrix_Array* matrices,
+                          Norvale_3DSticker_ModelInfo_Array* models);
 
   // Maps one face's landmarks from the delivered picture to the upright, unmirrored one, and
   // renumbers them when mirrored. `image` is the delivered picture. Returns nonzero; 0, with
