@@ -11,6 +11,7 @@ PITCHES = (-24.0, -12.0, 0.0, 12.0, 24.0)
 PEOPLE, SPREAD, SEED = 12, 1.0, 534
 ROW = 2.0
 TOP = 44.0  # mm above the tragions; the outline landmarks start lower
+TEMPLES = 24.0  # height of the ends of the outline
 
 
 def outline_skin(mean, normals):
@@ -83,3 +84,42 @@ def choose(count, mirror, must, never, wanted):
     if len(chosen) != wanted:
         raise ValueError("the candidates do not come out at their number")
     return sorted(chosen)
+
+
+def row_skin(points):
+    """The outline skin below the temples."""
+    return outline_skin(points, None) & (points[:, 1] < TEMPLES)
+
+
+def coverage(model, pitches, spread, people=20):
+    """Share of the silhouette rows with a candidate within 3 mm, and the number of rows.
+
+    The silhouette is that of the whole outline skin (cheeks, temples up to the outline's ends, jaw,
+    chin), sampled finely on the triangles, at yaws from -60 to 60 degrees in steps of 5.
+    """
+    import fields
+    import tables
+    table = tables.contour_candidates()
+    matrix = fields.subdivision_matrix(len(model.mean), model.triangles)
+    _, triangles = fields.subdivided(model.texture, model.triangles)
+    matrix = fields.subdivision_matrix(matrix.shape[0], triangles) @ matrix
+    rng = np.random.RandomState(SEED + 1)
+    hits = rows = 0
+    for person in range(people if spread else 1):
+        shape = rng.standard_normal(len(model.identity)) * spread
+        points = model.mean + np.tensordot(shape, model.identity, 1)
+        fine = matrix @ points
+        skin = np.flatnonzero(row_skin(fine))
+        tree = cKDTree(points[table])
+        for pitch in pitches:
+            for yaw in np.arange(-60.0, 60.1, 5.0):
+                seen = render.turned(fine[skin], yaw, pitch)
+                picture = seen[:, :2] / (CAMERA_DISTANCE - seen[:, 2:]) * CAMERA_DISTANCE
+                level = np.round(picture[:, 1] / ROW).astype(int)
+                for sign in (-1.0, 1.0):
+                    order = np.lexsort((-sign * picture[:, 0], level))
+                    first = order[np.unique(level[order], return_index=True)[1]]
+                    distance = tree.query(fine[skin[first]])[0]
+                    hits += (distance <= 3.0).sum()
+                    rows += len(first)
+    return hits / rows, rows

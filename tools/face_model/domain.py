@@ -10,6 +10,7 @@ import numpy as np
 from scipy.optimize import brentq
 from scipy.spatial import ConvexHull
 
+import nostril
 import sample_mesh
 
 U_MIDDLE = 0.499946
@@ -65,6 +66,7 @@ class Domain:
     border: np.ndarray  # dense polyline, from the top of the middle line to its bottom
     eye: np.ndarray  # dense closed polyline through the lid rims
     mouth: np.ndarray  # dense polyline from the middle of the upper rim to that of the lower
+    nostril: np.ndarray  # places round the rim of the nostril
     patch: dict  # flat places of the vertices 0 to 4
 
     def place(self, point):
@@ -128,4 +130,5 @@ def build(data):
     mouth = _catmull_rom(flat[[where[p] for p in sample_mesh.MOUTH_RING]], closed=False)
     patch = {k: layout.flat(*uv) for k, uv in FIRST_TEXTURE.items()}
     patch.update({k: np.array(v) for k, v in PATCH_FLAT.items()})
-    return Domain(layout, ids, flat, triangles, border, eye, mouth, patch)
+    return Domain(layout, ids, flat, triangles, border, eye, mouth,
+                  flat[[where[p] for p in nostril.rim_ids(data)]], patch)

@@ -75,6 +75,9 @@ class Anchors:
     triangle: np.ndarray
     weights: np.ndarray
 
+    def part(self, chosen):
+        return Anchors(self.triangle[chosen], self.weights[chosen])
+
     def matrix(self, triangles, count):
         rows = np.repeat(np.arange(len(self.triangle)), 3)
         return sp.csr_matrix((self.weights.ravel(), (rows, triangles[self.triangle].ravel())),
@@ -95,19 +98,19 @@ def locate(flat, triangles, places):
     return Anchors(near[rows, best], w[rows, best])
 
 
-def through_values(quadratic, matrix, values, weight):
+def through_values(quadratic, matrix, values, weights):
     """Fields (count, k) that bend least while `matrix @ field` stays at `values` (n, k)."""
-    system = (quadratic + weight * (matrix.T @ matrix)).tocsc()
-    return splu(system).solve(np.asarray(weight * (matrix.T @ values)))
+    pull = matrix.T @ sp.diags(weights)
+    return splu((quadratic + pull @ matrix).tocsc()).solve(np.asarray(pull @ values))
 
 
-def surface_through(quadratic, matrix, points, weight, slopes, slope_weight):
+def surface_through(quadratic, matrix, points, weights, slopes, slope_weight):
     """Vertex positions (count, 3) through `points`; `slopes` (m, 3 count) @ x should vanish.
 
     The unknowns of `slopes` are ordered x of all vertices, then y, then z.
     """
     count = quadratic.shape[0]
-    one = quadratic + weight * (matrix.T @ matrix)
-    system = sp.block_diag([one] * 3) + slope_weight * (slopes.T @ slopes)
-    right = np.concatenate([weight * (matrix.T @ points[:, k]) for k in range(3)])
+    pull = matrix.T @ sp.diags(weights)
+    system = sp.block_diag([quadratic + pull @ matrix] * 3) + slope_weight * (slopes.T @ slopes)
+    right = np.concatenate([pull @ points[:, k] for k in range(3)])
     return splu(system.tocsc()).solve(right).reshape(3, count).T

@@ -13,6 +13,7 @@ import candidates
 import domain
 import fields
 import measurements
+import nostril
 import numbering
 import surface
 import tables
@@ -23,9 +24,12 @@ IDENTITY_UNIT = 4.0  # standard deviations that one unit of an identity coeffici
 
 
 def build():
-    data = measurements.load()
+    data = nostril.with_nostrils(measurements.load())
     dom = domain.build(data)
     half = topology.half_mesh(dom)
+    mesh = topology.mirrored(half.flat, half.triangles, half.middle)
+    lifted = surface.lift(data, dom, mesh)
+    half = topology.refined(half, lifted)
     mesh = topology.mirrored(half.flat, half.triangles, half.middle)
     lifted = surface.lift(data, dom, mesh)
     mean, identity, expression = surface.modes(data, mesh, lifted)

@@ -22,6 +22,7 @@ class Measurements:
     identity: np.ndarray  # (16, n, 3) for one standard deviation
     expression: np.ndarray  # (20, n, 3) at full intensity
     expression_names: list
+    measured: np.ndarray  # (n,) False for points of our own
 
 
 def _modes(path):
@@ -47,4 +48,5 @@ def load():
         identity=identity,
         expression=expression,
         expression_names=names,
+        measured=np.ones(len(rows), bool),
     )

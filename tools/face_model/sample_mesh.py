@@ -6,21 +6,13 @@ Only the half at image left (x <= 0) is worked on; the other half is its mirror 
 import numpy as np
 
 from flatten import symmetric_dirichlet
+from nostril import rim_ids
 from triangulate import flip_by_shape, signed_areas, with_edges
 
 # Seen from here, inside the head, nearly every measured point shows its front.
 CENTRE = np.array([0.0, 15.0, 10.0])
 PLANE_SCALE = 95.0  # mm a radian, about the radius of the front of the face
 
-# The inner nostril is out of sight from the centre; its points are laid inside the nostril's rim
-# by hand, in the order in which they lie round the cavity (plane coordinates).
-NOSTRIL_PLACES = {
-    297: (-6.0, -29.0),
-    285: (-9.8, -29.0),
-    303: (-11.4, -32.4),
-    276: (-9.3, -31.3),
-    275: (-7.2, -31.5),
-}
 # The rims hide behind the lips: they are drawn up or down into the open mouth (mm).
 RIM_LIFT = {93: 1.5, 362: 1.5, 94: 1.2, 367: 0.0, 365: -1.0, 364: 1.0}
 MOUTH_RING = [89, 361, 88, 364, 87, 365, 367, 94, 362, 93]  # middle, corner, middle
@@ -38,12 +30,17 @@ def _project(points):
 
 def build(data):
     """Returns (ids, flat, triangles) of the half: point ids, flat places in mm, triangles."""
-    ids = np.flatnonzero((data.points[:, 0] < 1e-6) & (data.region != "pupil"))
+    ids = np.flatnonzero(
+        (data.points[:, 0] < 1e-6) & ~np.isin(data.region, ("pupil", "left_out")))
     where = {int(p): k for k, p in enumerate(ids)}
     posed = (data.points + JAW_OPENING * data.expression[0])[ids]
     plane = _project(posed)
-    for point, place in NOSTRIL_PLACES.items():
-        plane[where[point]] = place
+    # the hollow of the nostril hides behind its rim: it is laid inside the rim
+    nostril = [where[p] for p in rim_ids(data)]
+    rim = plane[nostril]
+    hollow = np.flatnonzero(data.region[ids] == "nostril_hollow")
+    plane[hollow[:-1]] = rim.mean(axis=0) + 0.55 * (rim[::2] - rim.mean(axis=0))
+    plane[hollow[-1]] = rim.mean(axis=0)
     for point, lift in RIM_LIFT.items():
         plane[where[point], 1] += lift
     middle = data.mirror[ids] == ids
@@ -52,6 +49,7 @@ def build(data):
     mouth = [where[p] for p in MOUTH_RING]
     eye = [where[p] for p in EYE_RING]
     rings = list(zip(mouth, mouth[1:])) + list(zip(eye, eye[1:] + eye[:1]))
+    rings += list(zip(nostril, nostril[1:] + nostril[:1]))
     triangles = with_edges(plane, rings)
 
     def in_hole(t):
@@ -63,7 +61,7 @@ def build(data):
 
     fill = np.array([t for t in triangles.tolist() if in_hole(t)])
     triangles = np.array([t for t in triangles.tolist() if not in_hole(t) and short(t)])
-    triangles = flip_by_shape(posed, plane, triangles)
+    triangles = flip_by_shape(posed, plane, triangles, {(min(e), max(e)) for e in rings})
     # Eyes and mouth keep the opening they have in the first layout: their fill is stretched along.
     reference = np.concatenate([posed[triangles], np.pad(plane, ((0, 0), (0, 1)))[fill]])
     flat = symmetric_dirichlet(

@@ -8,12 +8,9 @@ import scipy.sparse as sp
 import fields
 
 POINT_WEIGHT = 1e3
-NORMAL_WEIGHT = 1.0
+NORMAL_WEIGHT = 4.0
 ROUNDS = 2  # the bending is measured on the surface found before
-
-# Places between two measured points on the rim of the nostril, which the figures leave out: they
-# hold the rim where it runs from one point to the next.
-RIM_GUIDES = [(298, 295), (295, 307), (307, 311), (311, 314), (314, 308), (308, 298)]
+GUIDE_WEIGHT = 20.0  # points of our own bend to the measured ones
 
 
 @dataclass
@@ -69,22 +66,20 @@ def lift(data, dom, mesh, normal_weight=NORMAL_WEIGHT):
     matrix = anchors.matrix(triangles, len(flat))
     places = data.points[known.ids]
 
-    where = {int(p): k for k, p in enumerate(known.ids)}
-    guides = RIM_GUIDES + [(data.mirror[a], data.mirror[b]) for a, b in RIM_GUIDES]
-    pairs = np.array([(where[a], where[b]) for a, b in guides])
-    guide_flat = known.flat[pairs].mean(axis=1)
-    guide_matrix = fields.locate(flat, triangles, guide_flat).matrix(triangles, len(flat))
-    all_rows = sp.vstack([matrix, guide_matrix]).tocsr()
-    all_places = np.concatenate([places, places[pairs].mean(axis=1)])
+    weights = np.where(data.measured[known.ids], POINT_WEIGHT, GUIDE_WEIGHT)
+    slope_known = np.linalg.norm(data.normals[known.ids], axis=1) > 0.5
 
     quadratic = fields.bending(flat, triangles)
-    points = fields.through_values(quadratic, all_rows, all_places, POINT_WEIGHT)
+    points = fields.through_values(quadratic, matrix, places, weights)
     for _ in range(ROUNDS):
         quadratic = fields.bending(points, triangles)
-        slopes = _slopes(points, triangles, anchors, data.normals[known.ids])
+        slopes = _slopes(points, triangles, anchors.part(slope_known),
+                         data.normals[known.ids[slope_known]])
         points = fields.surface_through(
-            quadratic, all_rows, all_places, POINT_WEIGHT, slopes, normal_weight)
-    return Surface(flat, triangles, points, fields.bending(points, triangles), matrix, known.ids)
+            quadratic, matrix, places, weights, slopes, normal_weight)
+    measured = data.measured[known.ids]
+    return Surface(flat, triangles, points, fields.bending(points, triangles), matrix[measured],
+                   known.ids[measured])
 
 
 def mirror_field(field, mesh):
@@ -96,7 +91,7 @@ def modes(data, mesh, surface):
     count = len(mesh.flat)
     every = np.concatenate([data.identity, data.expression])
     values = every[:, surface.ids].transpose(1, 0, 2).reshape(len(surface.ids), -1)
-    carried = fields.through_values(surface.quadratic, surface.matrix, values, POINT_WEIGHT)
+    carried = fields.through_values(surface.quadratic, surface.matrix, values, np.full(len(values), POINT_WEIGHT))
     carried = carried[:count].reshape(count, len(every), 3).transpose(1, 0, 2)
     mean = surface.points[:count]
     mean = 0.5 * (mean + mirror_field(mean, mesh))

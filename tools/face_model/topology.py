@@ -4,29 +4,28 @@ The counts are fixed: 1812 vertices and 3456 triangles with the two eyes and the
 172 edges on the boundary, 86 a half.
 """
 
-from dataclasses import dataclass
+from dataclasses import dataclass, replace
 
 import numpy as np
-from scipy.spatial import Delaunay, cKDTree
+from scipy.spatial import cKDTree
 
 import domain as domain_module
-from triangulate import flip_by_shape, signed_areas, with_edges
+from relax import spread, spread_on_surface
+from triangulate import with_edges
 
 VERTICES, TRIANGLES, BOUNDARY_EDGES = 1812, 3456, 172
-MIDDLE_VERTICES = 64  # on the middle line; even, like the number of vertices
+MIDDLE_VERTICES = 76  # on the middle line; even, like the number of vertices
 SEED = 1812
 
 # Wanted edge length (mm): (name of the feature, at the feature, growth a millimetre of distance)
-GROWTH = {"eye": (2.7, 0.135), "lips": (2.8, 0.11), "nose": (2.8, 0.12), "brow": (4.6, 0.10)}
+GROWTH = {"eye": (2.5, 0.135), "lips": (2.6, 0.11), "nose": (2.5, 0.12), "brow": (4.6, 0.10)}
 SIDE_LENGTH = 5.4  # cheeks and jaw, where the outline of a turned head runs
 FOREHEAD_LENGTH = 9.5
 LIP_LINE = [75, 76, 77, 78, 84, 85, 86]
-NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 297, 285, 275, 276, 303, 307, 311, 314, 308,
-               295, 299, 309, 289, 292]
+NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 307, 311, 314, 308, 295, 299, 309, 289, 292]
 BROW_POINTS = list(range(19, 29))
 LID_RING = 24  # vertices round the eye; they come first
 INNER_POINTS = list(range(0, 9)) + list(range(19, 29)) + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86]
-WALL_DISTANCE = 0.6  # of the wanted edge length, between free vertices and edges that stay
 
 
 @dataclass
@@ -42,6 +41,8 @@ class HalfMesh:
     lid_middle: int  # the vertex above the pupil on the upper lid's rim
     border: list  # vertices along the outer border, top to bottom
     keep: frozenset  # edges that stay
+    wall: np.ndarray  # dense places along them
+    sizing: object  # wanted edge length at a flat place
 
 
 def _spaced(line, count, weight=None):
@@ -122,6 +123,10 @@ def _boundary(dom, sizing):
             mouth.append(add(dom.mouth[24 * k + 12]))
     join(mouth)
 
+    # rim of the nostril
+    rim = [add(place) for place in dom.nostril]
+    join(rim + rim[:1])
+
     # outer border
     line = dom.border
     outer = [add(p) for p in _spaced(line, domain_module.BORDER_EDGES, sizing(line) ** 0.5)]
@@ -129,29 +134,21 @@ def _boundary(dom, sizing):
     places[left] = line[np.argmin(line[:, 0])]
     join(outer)
 
-    # middle line, two stretches: border to upper lip, lower lip to border
-    stops = [[outer[0]] + [97, 98, 99, 100, 78, 89], [93, 84, 9] + [outer[-1]]]
-    spans = []
-    for stretch in stops:
-        marks = [places[s] if k in (outer[0], outer[-1]) and s in (outer[0], outer[-1])
-                 else dom.place(s) for k, s in ((s, s) for s in stretch)]
-        spans.append(np.array(marks))
-    middle_counts = _middle_counts(spans, sizing)
+    # middle line: from the border to the upper lip and from the lower lip to the border
+    def stop(point):
+        return named[point] if point in named else add(dom.place(point), point)
+
+    stretches = [[outer[0]] + [stop(p) for p in (97, 98, 99, 100, 78, 89)],
+                 [stop(p) for p in (93, 84, 9)] + [outer[-1]]]
+    spans = [np.array([places[v] for v in stretch]) for stretch in stretches]
     middle = []
-    for stretch, marks, counts in zip(stops, spans, middle_counts):
+    for stretch, marks, counts in zip(stretches, spans, _middle_counts(spans, sizing)):
         chain = []
-        for k, stop in enumerate(stretch):
-            if stop in (outer[0], outer[-1]) and (k == 0 or k == len(stretch) - 1) \
-                    and stop not in (89, 93):
-                chain.append(stop)
-            elif stop in named:
-                chain.append(named[stop])
-            else:
-                chain.append(add(marks[k], stop))
-            if k + 1 < len(stretch):
-                dense = np.linspace(marks[k], marks[k + 1], 200)
-                for p in _spaced(dense, counts[k], sizing(dense))[1:-1]:
-                    chain.append(add(p))
+        for k, count in enumerate(counts):
+            chain.append(stretch[k])
+            dense = np.linspace(marks[k], marks[k + 1], 200)
+            chain += [add(p) for p in _spaced(dense, count, sizing(dense))[1:-1]]
+        chain.append(stretch[-1])
         join(chain)
         middle += chain
     return places, edges, named, lid_middle, mouth, outer, middle
@@ -172,41 +169,6 @@ def _middle_counts(spans, sizing):
         counts[np.argmax(want * total / want.sum() / counts)] += 1
     split = len(spans[0]) - 1
     return counts[:split].tolist(), counts[split:].tolist()
-
-
-def _relax(places, count_fixed, sizing, inside, wall, rounds=400):
-    """Spreads the free places by springs that push apart (Persson and Strang's scheme).
-
-    Free places keep a distance from the edges that must stay (`wall`, dense places along them).
-    """
-    tree = cKDTree(wall)
-    for step in range(rounds):
-        triangles = Delaunay(places).simplices
-        centre = places[triangles].mean(axis=1)
-        triangles = triangles[inside(centre)]
-        edges = np.unique(np.sort(np.concatenate(
-            [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
-        vector = places[edges[:, 0]] - places[edges[:, 1]]
-        length = np.linalg.norm(vector, axis=1)
-        wanted = sizing(0.5 * (places[edges[:, 0]] + places[edges[:, 1]]))
-        wanted = wanted * 1.17 * np.sqrt((length**2).sum() / (wanted**2).sum())
-        force = np.maximum(wanted - length, 0.0) / length
-        push = vector * force[:, None]
-        total = np.zeros_like(places)
-        np.add.at(total, edges[:, 0], push)
-        np.add.at(total, edges[:, 1], -push)
-        pace = 0.2 if step < rounds * 0.8 else 0.1
-        moved = places + pace * total
-        distance, nearest = tree.query(moved)
-        least = WALL_DISTANCE * sizing(moved)
-        away = moved - wall[nearest]
-        close = distance < least
-        scale = least / np.maximum(distance, 1e-9)
-        moved[close] = wall[nearest][close] + away[close] * scale[close, None]
-        ok = inside(moved)
-        ok[:count_fixed] = False
-        places = np.where(ok[:, None], moved, places)
-    return places
 
 
 def half_mesh(dom):
@@ -249,7 +211,7 @@ def half_mesh(dom):
     if len(trial) < free:
         raise ValueError("too few starting places")
     places = np.concatenate([fixed, trial[:free]])
-    places = np.round(_relax(places, len(fixed), sizing, inside, wall), 5)
+    places = np.round(spread(places, len(fixed), sizing, inside, wall), 5)
 
     triangles = with_edges(places, edges)
     triangles = triangles[inside(places[triangles].mean(axis=1))]
@@ -259,7 +221,13 @@ def half_mesh(dom):
     spokes = [(patch[1], patch[k]) for k in (0, 2, 3, 4)]
     stay = frozenset((min(e), max(e)) for e in edges + spokes)
     return HalfMesh(places, triangles, np.array(sorted(middle)), np.arange(len(fixed)), named,
-                    patch, lid_middle, outer, stay)
+                    patch, lid_middle, outer, stay, wall, sizing)
+
+
+def refined(half, surface):
+    """The half mesh spread anew with the lengths it has on the lifted surface."""
+    flat, triangles = spread_on_surface(half, surface)
+    return replace(half, flat=np.round(flat, 5), triangles=triangles)
 
 
 @dataclass
