@@ -1,125 +1,158 @@
 """Chooses the mesh vertices that serve as contour candidates: where outlines of heads run."""
 
 import numpy as np
+import scipy.sparse as sp
 from scipy.spatial import cKDTree
 
 import render
 
 CAMERA_DISTANCE = 700.0
+ROW = 2.0  # mm between the rows in which an outline is read
+REACH = 3.0  # mm, how near a candidate has to be
+TEMPLES = 24.0  # mm above the tragions: the ends of the outline
+TOP = 44.0  # nodding heads bring skin above the temples to the outline's ends
+SEED = 534
+
+# Poses in which candidates are wanted, with their worth.
 YAWS = np.arange(-65.0, 65.1, 5.0)
-PITCHES = (-24.0, -12.0, 0.0, 12.0, 24.0)
-PEOPLE, SPREAD, SEED = 12, 1.0, 534
-ROW = 2.0
-TOP = 44.0  # mm above the tragions; the outline landmarks start lower
-TEMPLES = 24.0  # height of the ends of the outline
+PITCH_WORTH = {0.0: 2.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
+PEOPLE = 4
+FAR = 9.0  # mm on the skin; further along the view a candidate no longer stands for the place
+SKIN_WORTH = 0.3
+AGAIN = 0.05  # what is left of a demand once it is served
 
 
-def outline_skin(mean, normals):
-    """Skin on which the outline can run: cheeks, temples, jaw, chin and under it."""
-    x, y = np.abs(mean[:, 0]), mean[:, 1]
-    side = (x > np.where(y > 5, 47.0, np.where(y > -30.0, 33.0, 33.0))) & (y < TOP)
-    low = y < -66.0
-    return side | low
+def outline_skin(points, top=TEMPLES):
+    """Marks the skin on which the outline can run: cheeks, jaw, chin and under it."""
+    side = (np.abs(points[:, 0]) > np.where(points[:, 1] > 5, 47.0, 33.0)) & (points[:, 1] < top)
+    return side | (points[:, 1] < -66.0)
 
 
-def silhouette(points, skin, yaw, pitch):
-    """Numbers of the skin points that lie furthest out, row by row to both sides, and radially
-    below the mouth (points are in the upright head frame)."""
-    seen = render.turned(points[skin], yaw, pitch)
-    picture = seen[:, :2] / (CAMERA_DISTANCE - seen[:, 2:]) * CAMERA_DISTANCE
-    rows = np.round(picture[:, 1] / ROW).astype(int)
-    out = set()
+def seen_from(points, yaw, pitch):
+    """Places in the picture of a turned head, in mm at the head's own distance."""
+    turned = render.turned(points, yaw, pitch)
+    return turned[:, :2] / (CAMERA_DISTANCE - turned[:, 2:]) * CAMERA_DISTANCE
+
+
+def silhouette(picture):
+    """Numbers of the places furthest out to the left and to the right, row by row."""
+    level = np.round(picture[:, 1] / ROW).astype(int)
+    out = []
     for sign in (-1.0, 1.0):
-        order = np.lexsort((-sign * picture[:, 0], rows))
-        first = np.unique(rows[order], return_index=True)[1]
-        out.update(order[first].tolist())
-    columns = np.round(picture[:, 0] / ROW).astype(int)
-    middle = np.abs(picture[:, 0] - picture[:, 0].mean()) < 55.0
-    order = np.lexsort((picture[:, 1], columns))
-    order = order[middle[order]]
-    first = np.unique(columns[order], return_index=True)[1]
-    out.update(order[first].tolist())
-    return skin[sorted(out)]
+        order = np.lexsort((-sign * picture[:, 0], level))
+        out.append(order[np.unique(level[order], return_index=True)[1]])
+    return np.concatenate(out)
 
 
-def usage(mean, identity, fine_points, fine_identity, fine_triangles):
-    """How often each vertex is the nearest to the outline, over heads and poses."""
-    normals = render.vertex_normals(fine_points, fine_triangles)
-    skin = np.flatnonzero(outline_skin(fine_points, normals))
+def lower_edge(picture):
+    """Numbers of the lowest places, column by column, round the chin."""
+    column = np.round(picture[:, 0] / ROW).astype(int)
+    order = np.lexsort((picture[:, 1], column))
+    lowest = order[np.unique(column[order], return_index=True)[1]]
+    return lowest[np.abs(picture[lowest, 0] - picture[:, 0].mean()) < 45.0]
+
+
+def demands(points, identity, fine_points, fine_identity):
+    """Outline places, and which vertices serve them: a sparse 0/1 matrix and a worth a row.
+
+    A vertex serves a place when it is within reach in the picture and not far along the view; a
+    second, smaller demand asks for one within reach on the skin.
+    """
     rng = np.random.RandomState(SEED)
-    count = np.zeros(len(mean))
+    blocks, worths = [], []
     for person in range(PEOPLE):
-        shape = rng.standard_normal(len(identity)) * SPREAD * (person > 0)
+        shape = rng.standard_normal(len(identity)) * (person > 0)
         fine = fine_points + np.tensordot(shape, fine_identity, 1)
-        tree = cKDTree(mean + np.tensordot(shape, identity, 1))
-        for pitch in PITCHES:
+        coarse = points + np.tensordot(shape, identity, 1)
+        tree = cKDTree(coarse)
+        for pitch, worth in PITCH_WORTH.items():
+            skin = np.flatnonzero(outline_skin(fine, TEMPLES if pitch == 0 else TOP))
             for yaw in YAWS:
-                hit = silhouette(fine, skin, yaw, pitch)
-                np.add.at(count, tree.query(fine[hit])[1], 1.0)
-    return count
+                picture = seen_from(fine[skin], yaw, pitch)
+                flat = seen_from(coarse, yaw, pitch)
+                for rim, share in ((silhouette(picture), 1.0), (lower_edge(picture), 0.2)):
+                    rows, columns, skin_rows, skin_columns = [], [], [], []
+                    for k, close in enumerate(tree.query_ball_point(fine[skin[rim]], FAR)):
+                        close = np.array(close, int)
+                        offset = np.linalg.norm(flat[close] - picture[rim[k]], axis=1)
+                        serves = close[offset <= REACH]
+                        rows += [k] * len(serves)
+                        columns += serves.tolist()
+                        depth = np.linalg.norm(coarse[close] - fine[skin[rim[k]]], axis=1)
+                        serves = close[depth <= REACH]
+                        skin_rows += [k] * len(serves)
+                        skin_columns += serves.tolist()
+                    size = (len(rim), len(points))
+                    blocks.append(sp.csr_matrix((np.ones(len(rows)), (rows, columns)), size))
+                    blocks.append(sp.csr_matrix(
+                        (np.ones(len(skin_rows)), (skin_rows, skin_columns)), size))
+                    worths.append(np.full(len(rim), worth * share))
+                    worths.append(np.full(len(rim), worth * share * SKIN_WORTH))
+    return sp.vstack(blocks).tocsc(), np.concatenate(worths)
 
 
-def choose(count, mirror, must, never, wanted):
-    """`wanted` vertices, symmetric, the most used first; `must` are in, `never` are out."""
-    both = count + count[mirror]
+def choose(serves, worth, mirror, must, never, wanted):
+    """`wanted` vertices, symmetric, that serve most: greedily the pair that adds most each time.
+
+    `must` are in, `never` are out. Vertices on the middle line come in twos, so that the number
+    stays even.
+    """
     chosen = set(must) | {int(mirror[v]) for v in must}
     barred = set(never) | {int(mirror[v]) for v in never}
     if chosen & barred:
         raise ValueError("a vertex is both wanted and barred")
-    on_middle = [v for v in np.argsort(-both, kind="stable") if mirror[v] == v and v not in barred]
-    if (wanted - len(chosen)) % 2:
-        chosen.add(int(next(v for v in on_middle if v not in chosen)))
-    for v in np.argsort(-both, kind="stable"):
-        v, m = int(v), int(mirror[v])
-        if len(chosen) >= wanted:
-            break
-        if v in chosen or v in barred:
-            continue
-        if v == m:  # middle vertices only come in twos, to keep the number even
-            rest = [int(w) for w in on_middle if w not in chosen and w != v]
-            if rest and both[rest[0]] > 0:
-                chosen.update((v, rest[0]))
+    left = worth.copy()
+
+    def take(v):
+        chosen.add(v)
+        left[serves.indices[serves.indptr[v]:serves.indptr[v + 1]]] *= AGAIN
+
+    for v in sorted(chosen):
+        take(v)
+    odd = (wanted - len(chosen)) % 2
+    while len(chosen) < wanted:
+        gain = np.round(serves.T @ left, 6)
+        gain = gain + gain[mirror]
+        gain[list(chosen | barred)] = -1.0
+        room = wanted - len(chosen)
+        alone = mirror == np.arange(len(mirror))
+        if odd and room == 1:
+            gain[~alone] = -1.0
+        elif room == 2 and not odd:
+            gain[alone] = -1.0
+        v = int(np.argmax(gain))
+        take(v)
+        if alone[v]:
+            odd = 1 - odd
         else:
-            chosen.update((v, m))
-    if len(chosen) != wanted:
-        raise ValueError("the candidates do not come out at their number")
+            take(int(mirror[v]))
     return sorted(chosen)
 
 
-def row_skin(points):
-    """The outline skin below the temples."""
-    return outline_skin(points, None) & (points[:, 1] < TEMPLES)
+def coverage(model, table, pitches, spread, people=20):
+    """How well candidates cover the outline at yaws from -60 to 60 degrees, row by row.
 
-
-def coverage(model, pitches, spread, people=20):
-    """Share of the silhouette rows with a candidate within 3 mm, and the number of rows.
-
-    The silhouette is that of the whole outline skin (cheeks, temples up to the outline's ends, jaw,
-    chin), sampled finely on the triangles, at yaws from -60 to 60 degrees in steps of 5.
+    Returns the share of rows with a candidate within reach of the outline's place in the picture,
+    the share with one within reach on the skin, and the number of rows.
     """
     import fields
-    import tables
-    table = tables.contour_candidates()
-    matrix = fields.subdivision_matrix(len(model.mean), model.triangles)
+    cut = fields.subdivision_matrix(len(model.mean), model.triangles)
     _, triangles = fields.subdivided(model.texture, model.triangles)
-    matrix = fields.subdivision_matrix(matrix.shape[0], triangles) @ matrix
+    cut = fields.subdivision_matrix(cut.shape[0], triangles) @ cut
     rng = np.random.RandomState(SEED + 1)
-    hits = rows = 0
+    rows = in_picture = on_skin = 0
     for person in range(people if spread else 1):
         shape = rng.standard_normal(len(model.identity)) * spread
         points = model.mean + np.tensordot(shape, model.identity, 1)
-        fine = matrix @ points
-        skin = np.flatnonzero(row_skin(fine))
+        fine = cut @ points
+        skin = np.flatnonzero(outline_skin(fine))
         tree = cKDTree(points[table])
         for pitch in pitches:
             for yaw in np.arange(-60.0, 60.1, 5.0):
-                seen = render.turned(fine[skin], yaw, pitch)
-                picture = seen[:, :2] / (CAMERA_DISTANCE - seen[:, 2:]) * CAMERA_DISTANCE
-                level = np.round(picture[:, 1] / ROW).astype(int)
-                for sign in (-1.0, 1.0):
-                    order = np.lexsort((-sign * picture[:, 0], level))
-                    first = order[np.unique(level[order], return_index=True)[1]]
-                    distance = tree.query(fine[skin[first]])[0]
-                    hits += (distance <= 3.0).sum()
-                    rows += len(first)
-    return hits / rows, rows
+                picture = seen_from(fine[skin], yaw, pitch)
+                rim = silhouette(picture)
+                flat_tree = cKDTree(seen_from(points[table], yaw, pitch))
+                in_picture += (flat_tree.query(picture[rim])[0] <= REACH).sum()
+                on_skin += (tree.query(fine[skin[rim]])[0] <= REACH).sum()
+                rows += len(rim)
+    return in_picture / rows, on_skin / rows, rows

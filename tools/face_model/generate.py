@@ -37,13 +37,13 @@ def build():
 
     cut = fields.subdivision_matrix(len(mean), mesh.triangles)
     fine_identity = np.array([cut @ m for m in identity])
-    count = candidates.usage(mean, identity, lifted.points, fine_identity, lifted.triangles)
+    serves, worth = candidates.demands(mean, identity, lifted.points, fine_identity)
     owners = numbering.edge_owners(mesh.triangles)
     known = numbering.known_vertices(data, half, mesh, owners)
     table = set(tables.contour_candidates().tolist())
     must = [v for n, v in known.items() if n in table]
     never = [v for n, v in known.items() if n not in table]
-    chosen = candidates.choose(count, mesh.mirror, must, never, len(table))
+    chosen = candidates.choose(serves, worth, mesh.mirror, must, never, len(table))
     order, triangles = numbering.number(data, half, mesh, mean, chosen)
 
     texture = dom.layout.texture(mesh.flat)[order]

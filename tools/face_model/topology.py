@@ -55,6 +55,13 @@ def _spaced(line, count, weight=None):
     return np.column_stack([np.interp(wanted, along, line[:, k]) for k in range(2)])
 
 
+def _border_spacing(line):
+    """Relative edge lengths along the border: short before the ear, where outlines run on it."""
+    y = line[:, 1]
+    ear = np.clip((y + 105.0) / 20.0, 0.0, 1.0) * np.clip((18.0 - y) / 20.0, 0.0, 1.0)
+    return 1.75 - 0.75 * ear
+
+
 class Sizing:
     """Wanted edge length at a flat place."""
 
@@ -129,7 +136,7 @@ def _boundary(dom, sizing):
 
     # outer border
     line = dom.border
-    outer = [add(p) for p in _spaced(line, domain_module.BORDER_EDGES, sizing(line) ** 0.5)]
+    outer = [add(p) for p in _spaced(line, domain_module.BORDER_EDGES, _border_spacing(line))]
     left = outer[int(np.argmin(np.array(places)[outer][:, 0]))]
     places[left] = line[np.argmin(line[:, 0])]
     join(outer)
