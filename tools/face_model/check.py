@@ -21,11 +21,11 @@ import numbering
 import render
 import surface
 import tables
+import tensor
 import topology
 import writer
 from triangulate import boundary_edges, edge_owners, signed_areas
 
-IDENTITY_UNIT = 4.0
 PEOPLE = 1000
 SEED = 2141796
 FOLD = 140.0  # degrees between the normals of neighbouring triangles
@@ -52,14 +52,16 @@ class Model:
         self.raw = raw
         untilt = np.linalg.inv(writer.TILT)
         self.mean, identity, self.expression = (block @ untilt.T for block in raw[:3])
-        self.identity = identity / IDENTITY_UNIT
+        self.identity = identity / writer.IDENTITY_UNIT
         steps = raw[3].astype(float) * writer.TENSOR_STEP / writer.FIXED_POINT
-        self.tensor = steps @ untilt.T / IDENTITY_UNIT
+        self.tensor = steps @ untilt.T / writer.IDENTITY_UNIT
         self.steps = raw[3]
         text = (folder / "triangles.inc").read_text().split("\n", 1)[1]
         self.triangles = np.array(re.findall(r"\d+", text), int).reshape(-1, 3)
         text = (folder / "texture_coordinates.inc").read_text().split("\n", 1)[1]
         self.texture = np.array(re.findall(r"([\d.]+)f", text), float).reshape(-1, 2)
+
+        self.names = re.findall(r'"(\w+)"', (folder / "expression_names.inc").read_text())
 
     def mirror(self):
         """Mirrored vertex of each vertex, found through the texture, or None."""
@@ -173,10 +175,8 @@ def check_symmetry(model, report):
     report.line("the triangles are their own mirror image", "", same)
     flip = np.array([-1.0, 1.0, 1.0])
     raw = model.raw
-    names = measurements.load().expression_names
-    image = [k if n[-2:] not in ("_L", "_R") else
-             names.index(n[:-1] + {"L": "R", "R": "L"}[n[-1]]) for k, n in enumerate(names)]
-    sign = [-1.0 if n.endswith("_side") else 1.0 for n in names]
+    names = model.names
+    image, sign = zip(*(surface.partner(n, names) for n in names))
     worst = {
         "mean": np.abs(raw[0][mirror] * flip - raw[0]).max(),
         "identity modes": max(np.abs(m[mirror] * flip - m).max() for m in raw[1]),
@@ -219,7 +219,7 @@ def check_shape(model, report):
         turned += (np.einsum("ij,ij->i", before, after) < 0).sum()
     report.line("sharpest edge over 1,000 random people", f"{max(bends):.0f}", max(bends) < FOLD, limit)
     report.line("triangles turned over in 1,000 random people", turned, turned == 0, "= 0")
-    names = measurements.load().expression_names
+    names = model.names
     for k, name in enumerate(names):
         for amount in ((1.0, -1.0) if name.endswith("_side") else (1.0,)):
             bend, area = folds.bend(model.mean + amount * model.expression[k])
@@ -250,13 +250,8 @@ def check_shape(model, report):
 
 def interaction(model, person, amounts):
     """What the dense mesh adds for identity (standard deviations) times expression."""
-    used = used_pairs()
-    return np.einsum("k,j,kjvc->vc", person, amounts, model.tensor * used[:, :, None, None])
-
-
-def used_pairs():
-    k, j = np.indices((16, 20))
-    return (((k + j) % 2 == 0) | (k == 15)).astype(float)
+    used = tensor.read_pairs() * np.outer(person, amounts)
+    return np.tensordot(used, model.tensor, 2)
 
 
 def check_tensor(model, report):
@@ -265,18 +260,42 @@ def check_tensor(model, report):
     report.line("filled blocks of 320", int(filled.sum()), True)
     share = (model.steps != 0).any(axis=3).mean() * 100
     report.line("vertices of all blocks with a value, %", f"{share:.2f}", True)
-    unused = filled & (used_pairs() == 0)
+    unused = filled & ~tensor.read_pairs()
     report.line("filled blocks that nothing reads", int(unused.sum()), not unused.any(), "= 0")
     rng = np.random.RandomState(SEED)
-    person = rng.standard_normal((PEOPLE, 16)) / IDENTITY_UNIT
+    person = rng.standard_normal((PEOPLE, 16)) / writer.IDENTITY_UNIT
     amounts = rng.random_sample((PEOPLE, 20))
     products = np.abs(person[:, :, None] * amounts[:, None, :])
-    wraps = (products * (filled & (used_pairs() > 0)) >= 1.0).any(axis=(1, 2)).sum()
+    wraps = (products * (filled & tensor.read_pairs()) >= 1.0).any(axis=(1, 2)).sum()
     report.line("people of 1,000 whose products wrap", wraps, wraps == 0, "= 0")
     full = (np.abs(person)[:, :, None] * filled[None] >= 1.0).any(axis=(1, 2)).sum()
     report.line("the same with every expression at full intensity", full, full <= 1, "<= 1")
     report.line("largest identity value, mm a unit", f"{np.abs(model.raw[1]).max():.1f}", True)
     report.line("largest expression value, mm", f"{np.abs(model.raw[2]).max():.1f}", True)
+
+
+def check_transfer(model, report):
+    """Does the tensor bring an unusual face's expressions nearer to what its own shape asks for?
+
+    The measure is the whole deformation transfer, which the tensor holds to first order only.
+    """
+    report.head("Expressions of 12 unusual people (1.5 standard deviations a mode)")
+    rng = np.random.RandomState(SEED)
+    people = rng.standard_normal((12, 16)) * 1.5
+    transfer = tensor.Transfer(model.triangles)
+    for name in ("jaw_open", "mouth_smile_L", "mouth_funnel", "cheek_puff", "nose_sneer"):
+        k = model.names.index(name)
+        amounts = np.eye(20)[k]
+        without, with_it = [], []
+        for person in people:
+            face = model.mean + np.tensordot(person, model.identity, 1)
+            wanted = transfer.displacement(model.mean, model.expression[k], face)
+            plain = model.expression[k]
+            without.append(np.linalg.norm(plain - wanted, axis=1).max())
+            plain = plain + interaction(model, person, amounts)
+            with_it.append(np.linalg.norm(plain - wanted, axis=1).max())
+        a, b = np.mean(without), np.mean(with_it)
+        report.line(f"{name}: largest error without and with the tensor, mm", f"{a:.2f}, {b:.2f}", b < a)
 
 
 def check_texture(model, report):
@@ -344,9 +363,11 @@ def check_reconstruction(model, report):
     for k in range(16):
         worst = max(worst, mean_error(2 * model.identity[k], 2 * data.identity[k, ids]))
     report.line("identity modes at 2 standard deviations, worst", f"{worst:.3f}", worst < 0.5, "< 0.5")
-    errors = [mean_error(model.expression[k], data.expression[k, ids]) for k in range(20)]
+    names = data.expression_names
+    errors = [mean_error(model.expression[model.names.index(name)], data.expression[k, ids])
+              for k, name in enumerate(names)]
     worst = int(np.argmax(errors))
-    report.line(f"expressions at full intensity, worst ({data.expression_names[worst]})",
+    report.line(f"expressions at full intensity, worst ({names[worst]})",
                 f"{errors[worst]:.3f}", errors[worst] < 0.5, "< 0.5")
 
 
@@ -357,7 +378,8 @@ def check_candidates(model, report):
                                    ("20 random people", (0.0,), 1.0)):
         picture, skin, rows = candidates.coverage(model, table, pitches, spread)
         report.line(f"{title}, in the picture, of {rows} rows", f"{picture * 100:.1f}",
-                    picture >= 0.97, ">= 97")
+                    picture >= (0.97 if pitches == (0.0,) else 0.95),
+                    ">= 97" if pitches == (0.0,) else ">= 95")
         report.line(f"{title}, on the skin", f"{skin * 100:.1f}", True)
 
 
@@ -370,6 +392,7 @@ def main():
     check_symmetry(model, report)
     check_shape(model, report)
     check_tensor(model, report)
+    check_transfer(model, report)
     check_texture(model, report)
     check_reconstruction(model, report)
     check_candidates(model, report)

@@ -17,10 +17,10 @@ import nostril
 import numbering
 import surface
 import tables
+import tensor
 import topology
 import writer
 
-IDENTITY_UNIT = 4.0  # standard deviations that one unit of an identity coefficient stands for
 
 
 def build():
@@ -46,12 +46,20 @@ def build():
     chosen = candidates.choose(serves, worth, mesh.mirror, must, never, len(table))
     order, triangles = numbering.number(data, half, mesh, mean, chosen)
 
+    names = data.expression_names
+    at_left, at_right = topology.lid_rims(half, mesh)
+    blocks = tensor.build(mean, writer.IDENTITY_UNIT * identity, expression, names, mesh.triangles,
+                          {"eye_blink_R": at_left, "eye_blink_L": at_right})
+    blocks = np.array([surface.symmetric(row, names, mesh) for row in blocks])
+    places = tensor.expression_order(blocks, names)
+
     texture = dom.layout.texture(mesh.flat)[order]
     for number, pair in domain.FIRST_TEXTURE.items():
         texture[number] = pair
-    tensor = np.zeros((len(identity), len(expression), len(mean), 3), np.int8)
-    return dict(mean=mean[order], identity=identity[:, order], expression=expression[:, order],
-                tensor=tensor, triangles=triangles, texture=texture)
+    return dict(mean=mean[order], identity=identity[:, order],
+                expression=expression[places][:, order],
+                tensor=np.round(blocks[:, places][:, :, order], 4),
+                triangles=triangles, texture=texture, names=[names[j] for j in places])
 
 
 def main():
@@ -61,10 +69,12 @@ def main():
     model = build()
     out.mkdir(parents=True, exist_ok=True)
     writer.write_model(out / "face_model.bin", writer.tilted(model["mean"]),
-                       IDENTITY_UNIT * writer.tilted(model["identity"]),
-                       writer.tilted(model["expression"]), model["tensor"])
+                       writer.IDENTITY_UNIT * writer.tilted(model["identity"]),
+                       writer.tilted(model["expression"]),
+                       tensor.steps(writer.tilted(model["tensor"])))
     writer.write_triangles(out / "triangles.inc", model["triangles"])
     writer.write_texture(out / "texture_coordinates.inc", model["texture"])
+    writer.write_names(out / "expression_names.inc", model["names"])
 
 
 if __name__ == "__main__":

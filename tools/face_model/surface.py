@@ -86,26 +86,33 @@ def mirror_field(field, mesh):
     return field[mesh.mirror] * [-1.0, 1.0, 1.0]
 
 
+def partner(name, names):
+    """Number of the mirrored expression and the sign it comes with."""
+    if name[-2:] in ("_L", "_R"):
+        return names.index(name[:-1] + {"L": "R", "R": "L"}[name[-1]]), 1.0
+    return names.index(name), -1.0 if name.endswith("_side") else 1.0
+
+
+def symmetric(fields_of, names, mesh):
+    """Expression fields (..., n, 3) by number, made exact mirror images of their partners."""
+    out = []
+    for k, name in enumerate(names):
+        other, sign = partner(name, names)
+        out.append(0.5 * (fields_of[k] + sign * mirror_field(fields_of[other], mesh)))
+    return np.array(out)
+
+
 def modes(data, mesh, surface):
     """Mean (n, 3), identity modes (16, n, 3), expressions (20, n, 3): exactly symmetric."""
     count = len(mesh.flat)
     every = np.concatenate([data.identity, data.expression])
     values = every[:, surface.ids].transpose(1, 0, 2).reshape(len(surface.ids), -1)
-    carried = fields.through_values(surface.quadratic, surface.matrix, values, np.full(len(values), POINT_WEIGHT))
+    carried = fields.through_values(
+        surface.quadratic, surface.matrix, values, np.full(len(values), POINT_WEIGHT))
     carried = carried[:count].reshape(count, len(every), 3).transpose(1, 0, 2)
     mean = surface.points[:count]
     mean = 0.5 * (mean + mirror_field(mean, mesh))
-
     identity = carried[:len(data.identity)]
     identity = np.array([0.5 * (m + mirror_field(m, mesh)) for m in identity])
-    raw = carried[len(data.identity):]
-    names = data.expression_names
-    expression = []
-    for k, name in enumerate(names):
-        if name.endswith("_side"):  # to the other side is the mirror image
-            expression.append(0.5 * (raw[k] - mirror_field(raw[k], mesh)))
-        else:
-            partner = {"_L": "_R", "_R": "_L"}.get(name[-2:])
-            other = names.index(name[:-2] + partner) if partner else k
-            expression.append(0.5 * (raw[k] + mirror_field(raw[other], mesh)))
-    return mean, identity, np.array(expression)
+    return mean, identity, symmetric(
+        carried[len(data.identity):], data.expression_names, mesh)

@@ -231,6 +231,18 @@ def half_mesh(dom):
                     patch, lid_middle, outer, stay, wall, sizing)
 
 
+def lid_rims(half, mesh):
+    """Upper and lower lid rim of the eye at image left and of that at image right.
+
+    The rims run between the corners; the lower one holds the corners too.
+    """
+    corner = half.named[45]  # the inner one; the ring starts at the outer one
+    upper = list(range(half.named[39] + 1, corner))
+    lower = [half.named[39]] + list(range(LID_RING - 1, corner - 1, -1))
+    image = lambda chain: [int(mesh.mirror[v]) for v in chain]
+    return (upper, lower), (image(upper), image(lower))
+
+
 def refined(half, surface):
     """The half mesh spread anew with the lengths it has on the lifted surface."""
     flat, triangles = spread_on_surface(half, surface)

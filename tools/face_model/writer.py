@@ -6,6 +6,10 @@ import numpy as np
 # output takes back. The rows are the engine's own constants.
 TILT = np.array([[1.0, 0.0, 0.0], [0.0, 0.9397, 0.342], [0.0, -0.342, 0.9397]])
 FIXED_POINT = 256.0
+# Standard deviations of the population in one unit of an identity coefficient. The dense mesh holds
+# products of an identity and an expression coefficient in 16 bits that wrap at 1, so a unit has to
+# lie beyond every real person; the fits do not feel it.
+IDENTITY_UNIT = 8.0
 TENSOR_STEP = 40.0  # units of 1/256 mm
 
 
@@ -57,3 +61,8 @@ def write_triangles(path, triangles):
 def write_texture(path, texture):
     _table(path, "Texture coordinates (u, v) of the face mesh's vertices, v downwards.",
            [f"{{{u:.6f}f, {v:.6f}f}}," for u, v in texture], 4)
+
+
+def write_names(path, names):
+    _table(path, "Names of the expressions of the face model, in the order of the model file.",
+           [f'"{name}",' for name in names], 5)
