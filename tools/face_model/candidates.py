@@ -9,23 +9,47 @@ import render
 CAMERA_DISTANCE = 700.0
 ROW = 2.0  # mm between the rows in which an outline is read
 REACH = 3.0  # mm, how near a candidate has to be
-TEMPLES = 24.0  # mm above the tragions: the ends of the outline
-TOP = 44.0  # nodding heads bring skin above the temples to the outline's ends
+TEMPLES = 22.0  # mm above the tragions: the ends of the outline
+TOP = 32.0  # nodding heads bring skin above the temples to the outline's ends
+EAR = 11.0  # depth at which outlines end before the ear
 SEED = 534
 
 # Poses in which candidates are wanted, with their worth.
 YAWS = np.arange(-65.0, 65.1, 5.0)
-PITCH_WORTH = {0.0: 2.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
+PITCH_WORTH = {0.0: 3.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
 PEOPLE = 4
 FAR = 9.0  # mm on the skin; further along the view a candidate no longer stands for the place
-SKIN_WORTH = 0.3
+SKIN_WORTH = 0.2
 AGAIN = 0.05  # what is left of a demand once it is served
 
 
+# The skin on which outlines run, on the mean head: its lower end, the jaw's border, as height over
+# depth, and its inner end as distance from the middle over height (mm).
+JAW_BORDER = np.array([(8, -44), (18, -51), (32, -66.5), (51, -79.5), (70, -85.5), (86, -90.5)])
+INNER_END = np.array([(-92, 0), (-86, 14), (-80, 27), (-68, 32), (-30, 33), (5, 44), (24, 50), (60, 50)])
+
+
 def outline_skin(points, top=TEMPLES):
-    """Marks the skin on which the outline can run: cheeks, jaw, chin and under it."""
-    side = (np.abs(points[:, 0]) > np.where(points[:, 1] > 5, 47.0, 33.0)) & (points[:, 1] < top)
-    return side | (points[:, 1] < -66.0)
+    """Marks the skin of the cheeks, the jaw and the chin on which outlines run.
+
+    Not the underside of the chin: a candidate there would draw the chin's landmarks backwards and
+    nod the head.
+    """
+    above_jaw = points[:, 1] > np.interp(points[:, 2], *JAW_BORDER.T)
+    outside = np.abs(points[:, 0]) >= np.interp(points[:, 1], *INNER_END.T)
+    before_ear = points[:, 2] > EAR
+    return above_jaw & outside & before_ear & (points[:, 1] < top)
+
+
+def spare(points):
+    """How fit each vertex is as a candidate that is never asked for: above zero on the outline skin
+    and 4 mm round it, else falling with the distance on the front of the cheek, where no outline
+    and no edge of the hull comes near; lowest elsewhere."""
+    above_jaw = points[:, 1] > np.interp(points[:, 2], *JAW_BORDER.T)
+    distance = cKDTree(points[outline_skin(points, TOP)]).query(points)[0]
+    front = above_jaw & (points[:, 1] < 15.0) & (points[:, 1] > -66.0)
+    fitness = np.where(front, -1.0 - distance / 1000.0, -2.0)
+    return np.where(above_jaw & (distance < 4.0) & (points[:, 1] < TOP), 1.0, fitness)
 
 
 def seen_from(points, yaw, pitch):
@@ -66,7 +90,7 @@ def demands(points, identity, fine_points, fine_identity):
         coarse = points + np.tensordot(shape, identity, 1)
         tree = cKDTree(coarse)
         for pitch, worth in PITCH_WORTH.items():
-            skin = np.flatnonzero(outline_skin(fine, TEMPLES if pitch == 0 else TOP))
+            skin = np.flatnonzero(outline_skin(fine_points, TEMPLES if pitch == 0 else TOP))
             for yaw in YAWS:
                 picture = seen_from(fine[skin], yaw, pitch)
                 flat = seen_from(coarse, yaw, pitch)
@@ -91,7 +115,7 @@ def demands(points, identity, fine_points, fine_identity):
     return sp.vstack(blocks).tocsc(), np.concatenate(worths)
 
 
-def choose(serves, worth, mirror, must, never, wanted):
+def choose(points, serves, worth, mirror, must, never, wanted):
     """`wanted` vertices, symmetric, that serve most: greedily the pair that adds most each time.
 
     `must` are in, `never` are out. Vertices on the middle line come in twos, so that the number
@@ -101,6 +125,7 @@ def choose(serves, worth, mirror, must, never, wanted):
     barred = set(never) | {int(mirror[v]) for v in never}
     if chosen & barred:
         raise ValueError("a vertex is both wanted and barred")
+    fitness = spare(points)
     left = worth.copy()
 
     def take(v):
@@ -112,14 +137,14 @@ def choose(serves, worth, mirror, must, never, wanted):
     odd = (wanted - len(chosen)) % 2
     while len(chosen) < wanted:
         gain = np.round(serves.T @ left, 6)
-        gain = gain + gain[mirror]
-        gain[list(chosen | barred)] = -1.0
+        gain = np.where(fitness > 0, gain + gain[mirror], np.round(fitness + fitness[mirror], 6))
+        gain[list(chosen | barred)] = -9.0
         room = wanted - len(chosen)
         alone = mirror == np.arange(len(mirror))
         if odd and room == 1:
-            gain[~alone] = -1.0
+            gain[~alone] = -9.0
         elif room == 2 and not odd:
-            gain[alone] = -1.0
+            gain[alone] = -9.0
         v = int(np.argmax(gain))
         take(v)
         if alone[v]:
@@ -145,7 +170,7 @@ def coverage(model, table, pitches, spread, people=20):
         shape = rng.standard_normal(len(model.identity)) * spread
         points = model.mean + np.tensordot(shape, model.identity, 1)
         fine = cut @ points
-        skin = np.flatnonzero(outline_skin(fine))
+        skin = np.flatnonzero(outline_skin(cut @ model.mean))
         tree = cKDTree(points[table])
         for pitch in pitches:
             for yaw in np.arange(-60.0, 60.1, 5.0):

@@ -28,7 +28,7 @@ from triangulate import boundary_edges, edge_owners, signed_areas
 
 PEOPLE = 1000
 SEED = 2141796
-FOLD = 140.0  # degrees between the normals of neighbouring triangles
+FOLD = 150.0  # degrees between the normals of neighbouring triangles; rolled-in lips come to 130
 
 
 class Report:

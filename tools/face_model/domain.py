@@ -11,6 +11,7 @@ from scipy.optimize import brentq
 from scipy.spatial import ConvexHull
 
 import nostril
+import outline
 import sample_mesh
 
 U_MIDDLE = 0.499946
@@ -69,8 +70,30 @@ class Domain:
     nostril: np.ndarray  # places round the rim of the nostril
     patch: dict  # flat places of the vertices 0 to 4
 
+    points: np.ndarray  # the measured points of the half in space
+    rows: list = None  # (row, flat place) of the vertices for outlines
+    stops: list = None  # (row, length along the border) where those rows meet it
+
     def place(self, point):
         return self.flat[np.flatnonzero(self.ids == point)[0]]
+
+    def flat_of(self, places):
+        """Flat places of places in space: on the nearest of the coarse triangles."""
+        out = []
+        a, b, c = (self.points[self.triangles[:, k]] for k in range(3))
+        for p in places:
+            near = np.argsort(np.linalg.norm((a + b + c) / 3.0 - p, axis=1), kind="stable")[:12]
+            best = None
+            for t in near:
+                edges = np.column_stack([b[t] - a[t], c[t] - a[t]])
+                w = np.linalg.lstsq(edges, p - a[t], rcond=None)[0]
+                outside = max(0.0, -w[0], -w[1], w.sum() - 1.0)
+                distance = np.linalg.norm(edges @ w - (p - a[t])) + 30.0 * outside
+                if best is None or distance < best[0] - 1e-9:
+                    w = np.array([1.0 - w.sum(), *w])
+                    best = (distance, w @ self.flat[self.triangles[t]])
+            out.append(best[1])
+        return np.round(out, 4)
 
 
 def _catmull_rom(points, closed, steps=24):
@@ -130,5 +153,9 @@ def build(data):
     mouth = _catmull_rom(flat[[where[p] for p in sample_mesh.MOUTH_RING]], closed=False)
     patch = {k: layout.flat(*uv) for k, uv in FIRST_TEXTURE.items()}
     patch.update({k: np.array(v) for k, v in PATCH_FLAT.items()})
-    return Domain(layout, ids, flat, triangles, border, eye, mouth,
-                  flat[[where[p] for p in nostril.rim_ids(data)]], patch)
+    dom = Domain(layout, ids, flat, triangles, border, eye, mouth,
+                  flat[[where[p] for p in nostril.rim_ids(data)]], patch,
+                 data.points[ids])
+    dom.rows = outline.rows(dom.flat_of, dom.place)
+    dom.stops = outline.border_stops(dom.flat_of, dom.place, border)
+    return dom

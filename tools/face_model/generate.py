@@ -41,9 +41,10 @@ def build():
     owners = numbering.edge_owners(mesh.triangles)
     known = numbering.known_vertices(data, half, mesh, owners)
     table = set(tables.contour_candidates().tolist())
-    must = [v for n, v in known.items() if n in table]
+    must = [v for n, v in known.items() if n in table] + [
+        v for row, v in half.rows if row == int(row)]
     never = [v for n, v in known.items() if n not in table]
-    chosen = candidates.choose(serves, worth, mesh.mirror, must, never, len(table))
+    chosen = candidates.choose(mean, serves, worth, mesh.mirror, must, never, len(table))
     order, triangles = numbering.number(data, half, mesh, mean, chosen)
 
     names = data.expression_names

@@ -18,12 +18,14 @@ MIDDLE_VERTICES = 76  # on the middle line; even, like the number of vertices
 SEED = 1812
 
 # Wanted edge length (mm): (name of the feature, at the feature, growth a millimetre of distance)
-GROWTH = {"eye": (2.5, 0.135), "lips": (2.6, 0.11), "nose": (2.5, 0.12), "brow": (4.6, 0.10)}
-SIDE_LENGTH = 5.4  # cheeks and jaw, where the outline of a turned head runs
-FOREHEAD_LENGTH = 9.5
+GROWTH = {"eye": (2.3, 0.15), "lips": (2.4, 0.13), "nose": (2.3, 0.13), "brow": (4.8, 0.10)}
+SIDE_LENGTH = 5.8  # cheeks and jaw, where the outline of a turned head runs
+FOREHEAD_LENGTH = 11.0
+NECK_LENGTH = 9.0
 LIP_LINE = [75, 76, 77, 78, 84, 85, 86]
 NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 307, 311, 314, 308, 295, 299, 309, 289, 292]
 BROW_POINTS = list(range(19, 29))
+LEAST_DISTANCE = 3.6  # mm between the vertices along outlines and other fixed ones
 LID_RING = 24  # vertices round the eye; they come first
 INNER_POINTS = list(range(0, 9)) + list(range(19, 29)) + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86]
 
@@ -43,6 +45,7 @@ class HalfMesh:
     keep: frozenset  # edges that stay
     wall: np.ndarray  # dense places along them
     sizing: object  # wanted edge length at a flat place
+    rows: list  # (row, vertex) of the vertices along outlines
 
 
 def _spaced(line, count, weight=None):
@@ -55,11 +58,21 @@ def _spaced(line, count, weight=None):
     return np.column_stack([np.interp(wanted, along, line[:, k]) for k in range(2)])
 
 
-def _border_spacing(line):
-    """Relative edge lengths along the border: short before the ear, where outlines run on it."""
-    y = line[:, 1]
-    ear = np.clip((y + 105.0) / 20.0, 0.0, 1.0) * np.clip((18.0 - y) / 20.0, 0.0, 1.0)
-    return 1.75 - 0.75 * ear
+def _border_places(dom):
+    """Places along the border, from the top of the middle line to its bottom, and their rows.
+
+    Before the ear, where outlines of turned heads run on the border, they lie where the rows for
+    outlines meet it; above and below them the edges are even.
+    """
+    line = dom.border
+    along = np.concatenate([[0.0], np.cumsum(np.linalg.norm(np.diff(line, axis=0), axis=1))])
+    stops = [length for _, length in dom.stops]
+    rest = domain_module.BORDER_EDGES - (len(stops) - 1)
+    above = int(round(rest * stops[0] / (stops[0] + along[-1] - stops[-1])))
+    places = np.concatenate([np.linspace(0.0, stops[0], above + 1)[:-1], stops,
+                             np.linspace(stops[-1], along[-1], rest - above + 1)[1:]])
+    rows = {above + k: row for k, (row, _) in enumerate(dom.stops)}
+    return np.column_stack([np.interp(places, along, line[:, k]) for k in range(2)]), rows
 
 
 class Sizing:
@@ -79,9 +92,11 @@ class Sizing:
         size = np.full(len(places), np.inf)
         for name, (start, growth) in GROWTH.items():
             size = np.minimum(size, start + growth * self.trees[name].query(places)[0])
-        # the forehead is coarse, cheeks and jaw finer
+        # forehead and neck are coarse, cheeks and jaw finer
         up = np.clip((places[:, 1] - 22.0) / 25.0, 0.0, 1.0)
         size = np.minimum(size, SIDE_LENGTH + (FOREHEAD_LENGTH - SIDE_LENGTH) * up)
+        down = np.clip((-112.0 - places[:, 1]) / 25.0, 0.0, 1.0)
+        size = np.maximum(size, SIDE_LENGTH + (NECK_LENGTH - SIDE_LENGTH) * down)
         near = self.patch.query(places)[0]
         return np.maximum(size, 9.5 - 0.35 * near)
 
@@ -136,7 +151,9 @@ def _boundary(dom, sizing):
 
     # outer border
     line = dom.border
-    outer = [add(p) for p in _spaced(line, domain_module.BORDER_EDGES, _border_spacing(line))]
+    border, border_rows = _border_places(dom)
+    outer = [add(p) for p in border]
+    grid = [(row, outer[k]) for k, row in border_rows.items()]
     left = outer[int(np.argmin(np.array(places)[outer][:, 0]))]
     places[left] = line[np.argmin(line[:, 0])]
     join(outer)
@@ -158,7 +175,7 @@ def _boundary(dom, sizing):
         chain.append(stretch[-1])
         join(chain)
         middle += chain
-    return places, edges, named, lid_middle, mouth, outer, middle
+    return places, edges, named, lid_middle, mouth, outer, middle, grid
 
 
 def _middle_counts(spans, sizing):
@@ -180,7 +197,7 @@ def _middle_counts(spans, sizing):
 
 def half_mesh(dom):
     sizing = Sizing(dom)
-    places, edges, named, lid_middle, mouth, outer, middle = _boundary(dom, sizing)
+    places, edges, named, lid_middle, mouth, outer, middle, grid = _boundary(dom, sizing)
     patch = {}
     for k in range(5):
         patch[k] = len(places)
@@ -191,6 +208,11 @@ def half_mesh(dom):
         if point not in named:
             named[point] = len(places)
             places.append(dom.place(point))
+    crowd = cKDTree(np.array(places))
+    for row, place in dom.rows:
+        if crowd.query(place)[0] > LEAST_DISTANCE:
+            grid.append((row, len(places)))
+            places.append(place)
     fixed = np.array(places)
     fixed[middle, 0] = 0.0
 
@@ -228,7 +250,7 @@ def half_mesh(dom):
     spokes = [(patch[1], patch[k]) for k in (0, 2, 3, 4)]
     stay = frozenset((min(e), max(e)) for e in edges + spokes)
     return HalfMesh(places, triangles, np.array(sorted(middle)), np.arange(len(fixed)), named,
-                    patch, lid_middle, outer, stay, wall, sizing)
+                    patch, lid_middle, outer, stay, wall, sizing, grid)
 
 
 def lid_rims(half, mesh):
