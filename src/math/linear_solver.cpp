@@ -50,17 +50,20 @@ MRESULT MatDecompLU(const float* A, int32_t n, float* L, float* U) {
     const float* a = A + i * size;
     float* l = L + i * size;
     float* u = U + i * size;
-    // Both rows first gather the sums of L(i,k) U(k,j) over k, row of U by row of U; each sum still
-    // takes its terms in increasing k, as the column-by-column definition does.
-    for (size_t j = 0; j < size; ++j) l[j] = u[j] = 0.0f;
+    // The row of U first gathers the sums of L(i,k) U(k,j) over k, for the columns of both rows,
+    // row of U by row of U; each sum still takes its terms in increasing k, as the definition does
+    // that goes column by column.
+    for (size_t j = 0; j < size; ++j) u[j] = 0.0f;
     for (size_t k = 0; k < i; ++k) {
       const float* upper = U + k * size;
-      l[k] = (a[k] - l[k]) / upper[k];
-      for (size_t j = k + 1; j < i; ++j) l[j] += l[k] * upper[j];
-      for (size_t j = i; j < size; ++j) u[j] += l[k] * upper[j];
+      const float lower = (a[k] - u[k]) / upper[k];
+      l[k] = lower;
+      for (size_t j = k + 1; j < size; ++j) u[j] += lower * upper[j];
     }
-    l[i] = 1.0f;
+    for (size_t j = 0; j < i; ++j) u[j] = 0.0f;
     for (size_t j = i; j < size; ++j) u[j] = a[j] - u[j];
+    l[i] = 1.0f;
+    for (size_t j = i + 1; j < size; ++j) l[j] = 0.0f;
     if (std::fabs(static_cast<double>(u[i])) < kMinPivot) {
       std::puts("zero in LU");
       return N3DS_NUMERICAL;

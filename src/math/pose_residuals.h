@@ -2,6 +2,7 @@
 // projected by a pinhole camera, land from a face's landmarks in the picture.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "norvale_3d_sticker_core.h"
@@ -34,11 +35,20 @@ class PoseResiduals {
   // partly written, when a point has no depth.
   MRESULT Evaluate(const float* pose, float* r) const;
 
-  // The same with the Jacobian J of r (2 point_count x parameter_count, row-major; columns beyond
-  // the seventh are weighted like the others, but have no derivative of their own), J^T J and the
-  // gradient g = J^T r. Returns also N3DS_NO_MEMORY.
-  MRESULT Evaluate(MHandle memory, const float* pose, float* r, float* J, float* JtJ,
-                   float* g) const;
+  // The same with the Jacobian J of r, 2 point_count x parameter_count, row-major, and its
+  // transpose Jt unless that is null. Columns beyond the seventh are weighted like the others, but
+  // have no derivative of their own.
+  MRESULT Linearise(const float* pose, float* r, float* J, float* Jt) const;
+
+  // J^T J and the gradient g = J^T r of what Linearise gave.
+  void FormNormalEquations(const float* r, const float* J, const float* Jt, float* JtJ,
+                           float* g) const;
+
+  // Elements of a Jacobian.
+  size_t JacobianSize() const {
+    return 2 * static_cast<size_t>(problem_.point_count) *
+           static_cast<size_t>(problem_.parameter_count);
+  }
 
  private:
   enum class Middle : uint8_t { kNone, kVertical, kHorizontal, kOblique };
@@ -57,14 +67,26 @@ class PoseResiduals {
   static MiddleLine FindMiddleLine(const PoseProblem& problem);
   // Whether an outline landmark's observation (ox, oy) lies nearer the line than its projection.
   bool LiesInside(float u, float v, float ox, float oy) const;
-  // Turns a component pair along u and v (residuals or derivatives) into its part across the line.
-  void ProjectAcross(float* along_u, float* along_v, int32_t count) const;
+  // Turns a pair along u and v, residuals or derivatives, into its part across the line.
+  void ProjectAcross(float* along_u, float* along_v) const;
 
+  struct Points;
+  struct Derivatives;
+  struct View;
+  Points Project(const View& view, int32_t first, int32_t count) const;
+  static Derivatives Differentiate(const View& view, const Points& p);
+  void Store(const Derivatives& d, int32_t first, int32_t count, float* J, float* Jt) const;
+  void WeightOtherColumns(const Points& p, const bool* across, int32_t first, int32_t count,
+                          float* J, float* Jt) const;
   template <bool kDerivatives>
-  MRESULT EvaluatePoints(const float* pose, float* r, float* J) const;
+  MRESULT EvaluatePoints(const float* pose, float* r, float* J, float* Jt) const;
 
   PoseProblem problem_;
-  float group_factor_[4];  // by the landmark's group
+  // Factors by landmark: for its place, and for its moving with speech. Filled up to whole blocks.
+  static constexpr int32_t kFactorCount = 96;
+  float group_factor_[kFactorCount];
+  float speech_factor_[kFactorCount];
+  float ordinary_factor_;  // of landmarks beyond these
   MiddleLine middle_;
 };
 

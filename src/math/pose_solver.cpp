@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <utility>
 
 #include "platform/scratch_array.h"
 
@@ -64,11 +65,11 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
 
   const ScratchArray<float> J(memory, rows * n);
   const ScratchArray<float> JtJ(memory, n * n);
-  const ScratchArray<float> r(memory, rows);
-  const ScratchArray<float> r_new(memory, rows);
+  const ScratchArray<float> residuals_a(memory, rows);
+  const ScratchArray<float> residuals_b(memory, rows);
   const ScratchArray<float> g(memory, n);
   // Not the usual code: hosts know a memory too small for the problem itself as a missing argument.
-  if (!J || !JtJ || !r || !r_new || !g) return N3DS_NULL_ARGUMENT;
+  if (!J || !JtJ || !residuals_a || !residuals_b || !g) return N3DS_NULL_ARGUMENT;
   const ScratchArray<float> A(memory, n * n);
   const ScratchArray<float> h(memory, n);
   const ScratchArray<float> trial(memory, pose_size);
@@ -76,8 +77,17 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
   // Parameters that the pose does not have get no derivative: their columns stay zero.
   if (parameters > kPoseParameters) J.Zero();
 
-  MRESULT status = residuals.Evaluate(memory, pose, r.get(), J.get(), JtJ.get(), g.get());
-  if (status != N3DS_OK) return status;
+  float* r = residuals_a.get();
+  float* r_trial = residuals_b.get();
+
+  MRESULT status = N3DS_OK;
+  {
+    const ScratchArray<float> Jt(memory, rows * n);
+    status = residuals.Linearise(pose, r, J.get(), Jt.get());
+    if (status != N3DS_OK) return status;
+    if (!Jt) return N3DS_NO_MEMORY;
+    residuals.FormNormalEquations(r, J.get(), Jt.get(), JtJ.get(), g.get());
+  }
   float damping = kDampingSeed * LargestDiagonal(JtJ.get(), n);
   if (LargestMagnitude(g.get(), n) <= kGradientTolerance) {
     summary->stop = PoseSolverStop::kGradient;
@@ -104,10 +114,13 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
 
     std::copy_n(pose, pose_size, trial.get());
     for (size_t j = 0; j < n; ++j) trial[j] += h[j];
-    status = residuals.Evaluate(trial.get(), r_new.get());
+    // The derivatives come with the residuals: most steps are accepted, and then both are needed. J
+    // is free to be overwritten, since a rejected step goes on with the old J^T J and g.
+    const ScratchArray<float> Jt(memory, rows * n);
+    status = residuals.Linearise(trial.get(), r_trial, J.get(), Jt.get());
     if (status != N3DS_OK) return status;
 
-    const float ratio = GainRatio(r.get(), r_new.get(), rows, h.get(), g.get(), damping, n);
+    const float ratio = GainRatio(r, r_trial, rows, h.get(), g.get(), damping, n);
     if (!(ratio > 0.0f)) {  // also when it is not a number
       damping *= static_cast<float>(growth);
       growth *= 2;
@@ -115,9 +128,10 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
     }
 
     std::copy_n(trial.get(), n, pose);
+    std::swap(r, r_trial);
     ++summary->accepted_steps;
-    status = residuals.Evaluate(memory, pose, r.get(), J.get(), JtJ.get(), g.get());
-    if (status != N3DS_OK) return status;
+    if (!Jt) return N3DS_NO_MEMORY;
+    residuals.FormNormalEquations(r, J.get(), Jt.get(), JtJ.get(), g.get());
     if (LargestMagnitude(g.get(), n) <= kGradientTolerance) {
       summary->stop = PoseSolverStop::kGradient;
       return N3DS_OK;
