@@ -9,16 +9,17 @@
 #include <vector>
 
 #include "core/face_scene.h"
+#include "core/matching_reference.h"
 
 namespace n3ds {
 namespace {
 
 using ::testing::ElementsAre;
 using testing::Lcg;
+using testing::ReferenceAssignment;
 using testing::TestSeed;
 
 constexpr uint32_t kLandmarks = 101;
-const int kKey[] = {39, 45, 51, 57, 66, 67, 68, 69, 70, 71};
 
 // Landmark sets of faces of which all points lie at one place.
 std::vector<int32_t> FacesAt(const std::vector<int32_t>& places) {
@@ -97,12 +98,14 @@ TEST(AssignFaces, WithMoreFacesAScanTakesBackTheClaimOfItsFirstCandidate) {
 }
 
 TEST(AssignFaces, OnlyTheKeyLandmarksCount) {
+  const std::vector<int> key_landmarks = {39, 45, 51, 57, 66, 67, 68, 69, 70, 71};
   for (int k = 0; k < static_cast<int>(kLandmarks); k++) {
     for (size_t axis = 0; axis < 2; axis++) {
       // Face 0 lies exactly on track 0 but for landmark k; face 1 is a little off everywhere.
       std::vector<int32_t> faces = FacesAt({100, 101});
       faces[static_cast<size_t>(2 * k) + axis] = 2000;
-      const bool key = std::find(std::begin(kKey), std::end(kKey), k) != std::end(kKey);
+      const bool key =
+          std::find(key_landmarks.begin(), key_landmarks.end(), k) != key_landmarks.end();
       const std::vector<int32_t> expected =
           key ? std::vector<int32_t>{-1, 0} : std::vector<int32_t>{0, -1};
       EXPECT_EQ(Assign(faces, 2, FacesAt({100}), 1), expected) << k;
@@ -138,47 +141,6 @@ TEST(AssignFaces, DistancesWrapIn32Bits) {
   EXPECT_THAT(AssignPlaces({INT32_MAX - 2, INT32_MIN}, {INT32_MAX}), ElementsAre(-1, 0));
 }
 
-// The rules once more, on a table of distances.
-std::vector<int32_t> ReferenceAssignment(const std::vector<int32_t>& faces, size_t face_count,
-                                         const std::vector<int32_t>& previous,
-                                         size_t previous_count) {
-  const auto distance = [&](size_t j, size_t p) {
-    uint32_t sum = 0;
-    for (const int k : kKey) {
-      for (size_t axis = 0; axis < 2; axis++) {
-        const size_t at = 2 * static_cast<size_t>(k) + axis;
-        const int64_t d =
-            int64_t{faces[2 * kLandmarks * j + at]} - previous[2 * kLandmarks * p + at];
-        sum += static_cast<uint32_t>(d < 0 ? -d : d);
-      }
-    }
-    return static_cast<int32_t>(sum);
-  };
-  std::vector<int32_t> assigned(face_count, -1);
-  if (face_count > previous_count) {
-    for (size_t p = 0; p < previous_count; p++) {
-      int64_t nearest = INT64_MAX;
-      size_t candidate = face_count;
-      for (size_t j = 0; j < face_count; j++) {
-        if (distance(j, p) >= nearest) continue;
-        nearest = distance(j, p);
-        if (candidate < face_count) assigned[candidate] = -1;
-        candidate = j;
-        assigned[j] = static_cast<int32_t>(p);
-      }
-    }
-  } else {
-    for (size_t j = 0; j < face_count; j++) {
-      for (size_t p = 0; p < previous_count; p++) {
-        if (p == 0 || distance(j, p) < distance(j, static_cast<size_t>(assigned[j]))) {
-          assigned[j] = static_cast<int32_t>(p);
-        }
-      }
-    }
-  }
-  return assigned;
-}
-
 TEST(AssignFaces, MatchesTheStraightforwardVersionOnRandomFrames) {
   Lcg random(TestSeed());
   for (int trial = 0; trial < 5000; trial++) {
@@ -194,7 +156,7 @@ TEST(AssignFaces, MatchesTheStraightforwardVersionOnRandomFrames) {
       }
     }
     ASSERT_EQ(Assign(faces, face_count, previous, previous_count),
-              ReferenceAssignment(faces, face_count, previous, previous_count))
+              ReferenceAssignment(faces, face_count, previous, previous_count, kLandmarks))
         << trial;
   }
 }

@@ -7,12 +7,14 @@
 #include <vector>
 
 #include "core/face_scene.h"
+#include "core/rigid_reference.h"
 
 namespace n3ds {
 namespace {
 
 using testing::Bits;
 using testing::Lcg;
+using testing::ReferencePoseSmoothing;
 using testing::TestSeed;
 
 constexpr float kPrevious[7] = {0.5f, 0.25f, -0.5f, 0.125f, 10, -20, 600};
@@ -150,61 +152,6 @@ TEST(MotionFactor, LooksAtEyeCornersJawAndMouthOnly) {
   }
 }
 
-// All of it once more as one list of steps.
-std::vector<float> ReferenceSmoothing(const float* before, const std::vector<float>& fitted,
-                                      const std::vector<int32_t>& now,
-                                      const std::vector<int32_t>& previous, float width) {
-  const auto moves = [&](const std::vector<int>& points) {
-    float x = 0, y = 0;
-    for (const int k : points) {
-      const auto i = static_cast<size_t>(2 * k);
-      x += static_cast<float>(now[i] - previous[i]);
-      y += static_cast<float>(now[i + 1] - previous[i + 1]);
-    }
-    return std::fabs(x) + std::fabs(y);
-  };
-  std::vector<int> lower;
-  for (int k = 3; k <= 15; k++) lower.push_back(k);
-  for (int k = 75; k <= 94; k++) lower.push_back(k);
-  const float eyes = moves({39, 45, 51, 57});
-  const float g = moves(lower) * 800 / (width * 33);
-  float f = 1;
-  if (std::fabs(static_cast<double>(g)) > 1e-6 && g < 2.0f) {
-    const float h = eyes * 800 / (width * 4) / g;
-    if (h > 10) {
-      f = 2;
-    } else if (h > 2) {
-      f = 0.75f + 0.125f * h;
-    }
-  }
-  const float turn = std::fabs(fitted[0] - before[0]) + std::fabs(fitted[1] - before[1]) +
-                     std::fabs(fitted[2] - before[2]) + std::fabs(fitted[3] - before[3]);
-  const float d = 100 * turn + std::fabs(fitted[4] - before[4]) + std::fabs(fitted[5] - before[5]) +
-                  std::fabs(fitted[6] - before[6]);
-  float a = 0.2f;
-  if (d < 12) a = static_cast<float>(0.8 - 0.05 * static_cast<double>(d));
-  const float b = f * a;
-  float old_t = b, new_t = 1 - b, e;
-  if (static_cast<double>(b) > 0.8) {
-    old_t = 0.8f;
-    new_t = 0.19999999f;
-    e = 0.96f;
-  } else {
-    e = static_cast<float>(1.2 * static_cast<double>(b));
-  }
-  float old_q = e, new_q = 1 - e;
-  if (static_cast<double>(e) > 0.95) {
-    old_q = 0.95f;
-    new_q = 0.050000012f;
-  }
-  std::vector<float> pose;
-  for (size_t i = 0; i < 7; i++) {
-    pose.push_back(i < 4 ? old_q * before[i] + new_q * fitted[i]
-                         : old_t * before[i] + new_t * fitted[i]);
-  }
-  return pose;
-}
-
 TEST(SmoothPose, WithTheMotionFactorMatchesTheStraightforwardVersion) {
   Lcg random(TestSeed());
   for (int trial = 0; trial < 5000; trial++) {
@@ -223,7 +170,7 @@ TEST(SmoothPose, WithTheMotionFactorMatchesTheStraightforwardVersion) {
     }
     std::vector<float> actual = fitted;
     SmoothPose(kPrevious, MotionFactor(now.data(), previous.data(), width), actual.data());
-    ASSERT_EQ(Bits(actual), Bits(ReferenceSmoothing(kPrevious, fitted, now, previous, width)))
+    ASSERT_EQ(Bits(actual), Bits(ReferencePoseSmoothing(kPrevious, fitted, now, previous, width)))
         << trial;
   }
 }
