@@ -1,0 +1,127 @@
+// One rigid frame, whole and by its parts: matching, pose fit, contour. What the task pool costs is
+// in task_pool_bench.
+#include <benchmark/benchmark.h>
+
+#include <vector>
+
+#include "core/contour_correspondence.h"
+#include "core/face_matching.h"
+#include "core/pose_fitting.h"
+#include "core/pose_rounds.h"
+#include "synthetic_face.h"
+
+namespace {
+
+constexpr int32_t kWidth = 1280;
+constexpr int32_t kHeight = 720;
+constexpr int kFrames = 120;
+
+const std::vector<uint8_t>& Model() {
+  static const std::vector<uint8_t> model = n3ds::ReadModelFile(N3DS_DATA_DIR "/face_model.bin");
+  return model;
+}
+
+std::vector<std::vector<__tag_point>> Frames(int face_count) {
+  const n3ds::SyntheticFaces faces(Model(), kWidth, kHeight);
+  std::vector<std::vector<__tag_point>> frames(kFrames);
+  for (int i = 0; i < kFrames; i++) faces.Frame(i, face_count, &frames[static_cast<size_t>(i)]);
+  return frames;
+}
+
+std::vector<float> MeanShape() {
+  n3ds::TrackingContext* context = nullptr;
+  void* core = nullptr;
+  N3DS_Init(nullptr, &core);
+  N3DS_LoadFaceHouse(core, Model().data(), Model().size());
+  context = n3ds::ContextOf(core);
+  std::vector<float> shape(n3ds::kShapeSize);
+  for (size_t i = 0; i < shape.size(); i++)
+    shape[i] = static_cast<float>(context->meanShape[i]) / 256.0f;
+  N3DS_UnInit(core);
+  return shape;
+}
+
+void RigidFrame(benchmark::State& state) {
+  const int face_count = static_cast<int>(state.range(0));
+  auto frames = Frames(face_count);
+  void* engine = Norvale_3DSticker_CreateEngine();
+  Norvale_3DSticker_InitializeEx(engine, Model().data(), static_cast<uint32_t>(Model().size()), 0,
+                                 0);
+  NSVL_OFFSCREEN image = {};
+  image.width = kWidth;
+  image.height = kHeight;
+  static float landmarks_3d[N3DS_MAX_FACES][3 * 101];
+  static Norvale_3DSticker_Matrix_Array out;
+  for (int k = 0; k < N3DS_MAX_FACES; k++) out.faces[k].landmarks3D = landmarks_3d[k];
+  size_t frame = 0;
+  for (auto _ : state) {
+    const MRESULT result =
+        Norvale_3DSticker_Process(engine, &image, static_cast<uint32_t>(face_count), 101,
+                                  frames[frame].data(), nullptr, nullptr, &out);
+    if (result != N3DS_OK) state.SkipWithError("frame failed");
+    frame = (frame + 1) % frames.size();
+  }
+  Norvale_3DSticker_DestroyEngine(engine);
+}
+BENCHMARK(RigidFrame)->Arg(1)->Arg(3)->Arg(5)->Unit(benchmark::kMicrosecond)->UseRealTime();
+
+void Matching(benchmark::State& state) {
+  const auto face_count = static_cast<uint32_t>(state.range(0));
+  const auto frames = Frames(static_cast<int>(face_count));
+  n3ds::FaceAssignment assignment;
+  size_t frame = 1;
+  for (auto _ : state) {
+    n3ds::AssignFaces(&frames[frame][0].x, face_count, &frames[frame - 1][0].x, face_count, 101,
+                      &assignment);
+    benchmark::DoNotOptimize(assignment);
+    frame = frame % (frames.size() - 1) + 1;
+  }
+}
+BENCHMARK(Matching)->Arg(1)->Arg(3)->Arg(5)->Unit(benchmark::kMicrosecond);
+
+// A tracked face: every fit starts from the pose of the frame before.
+struct TrackedFace {
+  std::vector<float> shape = MeanShape();
+  std::vector<std::vector<__tag_point>> frames = Frames(1);
+  float camera[9] = {(kWidth + kHeight) / 2.0f,
+                     0,
+                     kWidth / 2.0f,
+                     0,
+                     (kWidth + kHeight) / 2.0f,
+                     kHeight / 2.0f,
+                     0,
+                     0,
+                     1};
+  float pose[7] = {};
+  int32_t contour[n3ds::kOutlineLandmarkCount] = {};
+  n3ds::PoseRounds rounds{nullptr, shape.data(), camera, pose, contour};
+
+  TrackedFace() {
+    rounds.StartNewFace();
+    for (int i = 0; i < 4; i++) {
+      Fit(0);
+      rounds.UpdateContour(&frames[0][0].x);
+    }
+  }
+  bool Fit(size_t frame) { return rounds.Fit(&frames[frame][0].x, contour, {0, 1.0f, 1.0f, 1.0f}); }
+};
+
+void PoseFit(benchmark::State& state) {
+  TrackedFace face;
+  size_t frame = 0;
+  for (auto _ : state) {
+    if (!face.Fit(frame)) state.SkipWithError("fit failed");
+    frame = (frame + 1) % face.frames.size();
+  }
+}
+BENCHMARK(PoseFit)->Unit(benchmark::kMicrosecond);
+
+void Contour(benchmark::State& state) {
+  TrackedFace face;
+  for (auto _ : state) face.rounds.UpdateContour(&face.frames[0][0].x);
+}
+BENCHMARK(Contour)->Unit(benchmark::kMicrosecond);
+
+}  // namespace
+
+BENCHMARK_MAIN();
