@@ -16,11 +16,11 @@ SEED = 534
 
 # Poses in which candidates are wanted, with their worth.
 YAWS = np.arange(-65.0, 65.1, 5.0)
-PITCH_WORTH = {0.0: 3.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
+PITCH_WORTH = {0.0: 5.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
 PEOPLE = 4
 FAR = 9.0  # mm on the skin; further along the view a candidate no longer stands for the place
-SKIN_WORTH = 0.2
-AGAIN = 0.05  # what is left of a demand once it is served
+SKIN_WORTH = 0.05
+AGAIN = 0.02  # what is left of a demand once it is served
 
 
 # The skin on which outlines run, on the mean head: its lower end, the jaw's border, as height over
@@ -94,7 +94,7 @@ def demands(points, identity, fine_points, fine_identity):
             for yaw in YAWS:
                 picture = seen_from(fine[skin], yaw, pitch)
                 flat = seen_from(coarse, yaw, pitch)
-                for rim, share in ((silhouette(picture), 1.0), (lower_edge(picture), 0.2)):
+                for rim, share in ((silhouette(picture), 1.0), (lower_edge(picture), 0.1)):
                     rows, columns, skin_rows, skin_columns = [], [], [], []
                     for k, close in enumerate(tree.query_ball_point(fine[skin[rim]], FAR)):
                         close = np.array(close, int)

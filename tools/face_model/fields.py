@@ -31,7 +31,6 @@ def subdivided(places, triangles):
 
 def subdivision_matrix(count, triangles):
     """The linear map from vertex values to those of the mesh cut in four."""
-    eye, _ = subdivided(np.eye(count)[:, :0], triangles)
     edges = np.unique(np.sort(np.concatenate(
         [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
     rows = np.repeat(np.arange(len(edges)), 2)

@@ -14,14 +14,14 @@ from relax import spread, spread_on_surface
 from triangulate import with_edges
 
 VERTICES, TRIANGLES, BOUNDARY_EDGES = 1812, 3456, 172
-MIDDLE_VERTICES = 76  # on the middle line; even, like the number of vertices
+MIDDLE_VERTICES = 72  # on the middle line; even, like the number of vertices
 SEED = 1812
 
 # Wanted edge length (mm): (name of the feature, at the feature, growth a millimetre of distance)
-GROWTH = {"eye": (2.3, 0.15), "lips": (2.4, 0.13), "nose": (2.3, 0.13), "brow": (4.8, 0.10)}
-SIDE_LENGTH = 5.8  # cheeks and jaw, where the outline of a turned head runs
+GROWTH = {"eye": (2.2, 0.16), "lips": (2.2, 0.14), "nose": (2.1, 0.14), "brow": (5.5, 0.2)}
+SIDE_LENGTH = 5.9  # cheeks and jaw, where the outline of a turned head runs
 FOREHEAD_LENGTH = 11.0
-NECK_LENGTH = 9.0
+NECK_LENGTH = 11.0
 LIP_LINE = [75, 76, 77, 78, 84, 85, 86]
 NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 307, 311, 314, 308, 295, 299, 309, 289, 292]
 BROW_POINTS = list(range(19, 29))
