@@ -26,8 +26,8 @@ FEATURES = [
     list(range(75, 87)) + [75], list(range(87, 95)) + [87],
 ]
 # The occluder: the face pulled back a little, and a skull behind it (centre and half axes, mm).
-SKULL_CENTRE = np.array([0.0, 38.0, -6.0])
-SKULL_AXES = np.array([73.0, 92.0, 96.0])
+SKULL_CENTRE = np.array([0.0, 34.0, -14.0])
+SKULL_AXES = np.array([72.0, 92.0, 84.0])
 PULL = 0.985
 
 
