@@ -21,11 +21,13 @@ MRESULT ReadFile(const char* path, uint8_t** bytes, size_t* size) {
   const bool has_end = length >= 0 && length < std::numeric_limits<long>::max();
   if (has_end && std::fseek(file, 0, SEEK_SET) == 0) {
     *size = static_cast<size_t>(length);
-    // One byte at least: an empty file is read, and the loader says what it thinks of it.
-    *bytes = static_cast<uint8_t*>(std::malloc(*size > 0 ? *size : 1));
+    // One byte at least: an empty file is read, and the loader says what it thinks of it; a
+    // directory without a size shows here that it cannot be read.
+    const size_t capacity = *size > 0 ? *size : 1;
+    *bytes = static_cast<uint8_t*>(std::malloc(capacity));
     if (*bytes == nullptr) {
       result = N3DS_NO_MEMORY;
-    } else if (std::fread(*bytes, 1, *size, file) == *size) {
+    } else if (std::fread(*bytes, 1, capacity, file) >= *size && std::ferror(file) == 0) {
       result = N3DS_OK;
     }
   }
