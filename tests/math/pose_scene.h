@@ -61,10 +61,18 @@ inline Pose MakePose(float about_x, float about_y, float about_z, float tx, floa
   return {-q[1], q[0], q[3], -q[2], tx, ty, tz};
 }
 
-inline Pose RandomPose(std::mt19937& random) {
-  return MakePose(Uniform(random, -0.3f, 0.3f), Uniform(random, -0.7f, 0.7f),
-                  Uniform(random, -0.3f, 0.3f), Uniform(random, -100, 100),
-                  Uniform(random, -80, 80), Uniform(random, 400, 1200));
+// Bounds of a random pose: angles in radians about the image's axes, shift in mm.
+struct PoseRange {
+  float about_x, about_y, about_z, x, y, nearest, farthest;
+};
+
+inline Pose RandomPose(std::mt19937& random,
+                       const PoseRange& range = {0.3f, 0.7f, 0.3f, 100, 80, 400, 1200}) {
+  // One after the other: compilers differ in the order in which they evaluate arguments.
+  const auto within = [&](float bound) { return Uniform(random, -bound, bound); };
+  const float about_x = within(range.about_x), about_y = within(range.about_y);
+  const float about_z = within(range.about_z), x = within(range.x), y = within(range.y);
+  return MakePose(about_x, about_y, about_z, x, y, Uniform(random, range.nearest, range.farthest));
 }
 
 // The landmarks of a pose in double, rounded to float.
