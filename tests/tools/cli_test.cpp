@@ -1,105 +1,23 @@
 // The tool as its user meets it: exit codes, one sentence on stderr, nothing half-written.
-#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <spawn.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
-#include <algorithm>
-#include <cstdlib>
 #include <nlohmann/json.hpp>
-#include <sstream>
-#include <string>
-#include <vector>
 
-#include "render/picture.h"
-#include "scratch_folder.h"
+#include "tool_test.h"
 
 namespace n3ds::tool {
 namespace {
 
 using ::testing::AllOf;
 using ::testing::ElementsAre;
-using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::SizeIs;
-using ::testing::StartsWith;
-
-constexpr int kFailed = 1;
-constexpr int kUsage = 2;
-
-std::string ExampleTrack(const std::string& name) {
-  return N3DS_SOURCE_DIR "/examples/tracks/" + name + ".track.jsonl";
-}
 
 const std::string kModel = N3DS_SOURCE_DIR "/data/face_model.bin";
 
-struct Outcome {
-  int exit_code = -1;  // -1: killed by a signal
-  std::string out;
-  std::string err;
-};
-
-class Cli : public ::testing::Test {
- protected:
-  // Runs n3ds with its output in files outside of the folder under test.
-  Outcome Run(std::vector<std::string> arguments) {
-    arguments.insert(arguments.begin(), "n3ds");
-    std::vector<char*> argv;
-    for (std::string& argument : arguments) argv.push_back(argument.data());
-    argv.push_back(nullptr);
-    posix_spawn_file_actions_t actions;
-    posix_spawn_file_actions_init(&actions);
-    constexpr int kFlags = O_WRONLY | O_CREAT | O_TRUNC;
-    const std::string out = console_.Path("out");
-    const std::string err = console_.Path("err");
-    posix_spawn_file_actions_addopen(&actions, STDOUT_FILENO, out.c_str(), kFlags, 0600);
-    posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, err.c_str(), kFlags, 0600);
-    pid_t child = -1;
-    const int failure = posix_spawn(&child, N3DS_TOOL, &actions, nullptr, argv.data(), environ);
-    posix_spawn_file_actions_destroy(&actions);
-    Outcome outcome;
-    if (failure != 0) return outcome;
-    int status = 0;
-    waitpid(child, &status, 0);
-    if (WIFEXITED(status)) outcome.exit_code = WEXITSTATUS(status);
-    outcome.out = console_.Read("out");
-    outcome.err = console_.Read("err");
-    return outcome;
-  }
-
-  // The command fails with one sentence that holds `text`, and leaves only `names` in the folder.
-  void ExpectFailure(const std::vector<std::string>& arguments, int exit_code,
-                     const std::string& text, const std::vector<std::string>& names = {}) {
-    const Outcome outcome = Run(arguments);
-    EXPECT_EQ(outcome.exit_code, exit_code) << outcome.err;
-    EXPECT_THAT(outcome.err, AllOf(StartsWith("n3ds: "), HasSubstr(text), EndsWith("\n")));
-    EXPECT_EQ(std::count(outcome.err.begin(), outcome.err.end(), '\n'), 1) << outcome.err;
-    EXPECT_EQ(folder_.Names(), names);
-  }
-
-  // An example track with one line replaced (counted from 1).
-  std::string Damaged(std::size_t line, const std::string& by) {
-    std::istringstream in(ReadFile(ExampleTrack("photo_group_3")));
-    std::ostringstream out;
-    std::string text;
-    for (std::size_t number = 1; std::getline(in, text); ++number) {
-      out << (number == line ? by : text) << '\n';
-    }
-    return console_.Write("damaged.track.jsonl", out.str());
-  }
-
-  static std::string ReadFile(const std::string& path) {
-    std::ostringstream content;
-    content << std::ifstream(path, std::ios::binary).rdbuf();
-    return content.str();
-  }
-
-  ScratchFolder folder_;
-  ScratchFolder console_;
-};
+using Cli = ToolTest;
 
 TEST_F(Cli, EveryCommandHelpsWithExamples) {
   for (const std::vector<std::string>& command : {std::vector<std::string>{},
@@ -216,8 +134,6 @@ TEST_F(Cli, RefusesDamagedModels) {
     const std::string model = console_.Write("m.bin", content);
     ExpectFailure({"track", track, "--model", model}, kFailed, "m.bin: ");
     ExpectFailure({"model", "info", model}, kFailed, text);
-    ExpectFailure({"render", track, "--model", model, "--out", folder_.Path("a.png")}, kFailed,
-                  "m.bin: ");
   }
 }
 
@@ -260,95 +176,6 @@ TEST_F(Cli, EvalNeedsTruth) {
   ExpectFailure({"eval", ExampleTrack("synthetic_natural"), ExampleTrack("real_expressions"),
                  "--csv", folder_.Path("scores.csv")},
                 kFailed, "real_expressions.track.jsonl: the track has no truth to compare with");
-}
-
-TEST_F(Cli, RenderMakesAPicture) {
-  const Outcome outcome = Run({"render", ExampleTrack("real_head_move_90"), "--frame", "3",
-                               "--size", "320x320", "--out", folder_.Path("a.png")});
-  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  EXPECT_THAT(folder_.Names(), ElementsAre("a.png"));
-  const Picture picture = ReadPicture(folder_.Path("a.png"));
-  EXPECT_EQ(picture.width, 320);  // upright: 640 x 480
-  EXPECT_EQ(picture.height, 240);
-}
-
-TEST_F(Cli, RenderMakesAContactSheet) {
-  const Outcome outcome = Run({"render", ExampleTrack("synthetic_three"), "--contact-sheet", "6",
-                               "--size", "160x160", "--out", folder_.Path("sheet.png")});
-  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  const Picture picture = ReadPicture(folder_.Path("sheet.png"));
-  EXPECT_EQ((picture.width + 4) / 164 * ((picture.height + 4) / 94), 6);
-}
-
-TEST_F(Cli, RenderMakesAFolderOfFrames) {
-  const Outcome outcome = Run({"render", ExampleTrack("real_man_270_mirror"), "--every", "15",
-                               "--size", "64x64", "--out", folder_.Path("frames")});
-  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  std::vector<std::string> names;
-  for (const auto& entry : std::filesystem::directory_iterator(folder_.Path("frames"))) {
-    names.push_back(entry.path().filename());
-  }
-  std::sort(names.begin(), names.end());
-  EXPECT_THAT(names, ElementsAre("frame_000000.png", "frame_000015.png", "frame_000030.png"));
-}
-
-TEST_F(Cli, RenderMakesAFilm) {
-  const Outcome outcome = Run({"render", ExampleTrack("real_man_270_mirror"), "--every", "3",
-                               "--size", "99x99", "--out", folder_.Path("a.mp4")});
-  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  EXPECT_THAT(folder_.Names(), ElementsAre("a.mp4"));
-  EXPECT_THAT(folder_.Read("a.mp4").substr(4, 4), "ftyp");
-}
-
-TEST_F(Cli, RenderDrawsOverAPhoto) {
-  Picture photo(320, 320);
-  for (std::size_t i = 0; i < photo.rgba.size(); ++i) photo.rgba[i] = i % 4 == 3 ? 255 : 90;
-  WritePng(console_.Path("photo.png"), photo);
-  const Outcome outcome =
-      Run({"render", ExampleTrack("photo_astronaut"), "--image", console_.Path("photo.png"),
-           "--size", "320x320", "--out", folder_.Path("a.png")});
-  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  const Picture drawn = ReadPicture(folder_.Path("a.png"));
-  EXPECT_EQ(drawn.Pixel(5, 300)[0], 90);  // the ground is the photo
-  std::size_t changed = 0;
-  for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) changed += drawn.rgba[i] != 90 ? 1U : 0U;
-  EXPECT_GT(changed, 1000u);
-}
-
-TEST_F(Cli, RenderRefusesWhatItCannotDraw) {
-  const std::string track = ExampleTrack("real_man_270_mirror");
-  const std::string png = folder_.Path("a.png");
-  ExpectFailure({"render", track, "--out", png, "--frame", "999"}, kFailed,
-                "there is no frame 999");
-  ExpectFailure({"render", track, "--out", png, "--frame", "1", "--contact-sheet", "4"}, kFailed,
-                "exclude each other");
-  ExpectFailure({"render", track, "--out", folder_.Path("a.mp4"), "--frame", "1"}, kFailed,
-                "must end in .png");
-  for (const char* size : {"0x0", "100", "axb", "100x100x", "99999x10"}) {
-    ExpectFailure({"render", track, "--out", png, "--size", size}, kFailed, "--size ");
-  }
-  ExpectFailure({"render", track, "--out", png, "--image", track}, kFailed,
-                "neither a PNG nor a JPEG");
-  ExpectFailure({"render", track, "--out", png, "--image", folder_.Path("none.jpg")}, kFailed,
-                "none.jpg: the picture cannot be opened");
-  WritePng(console_.Path("square.png"), Picture(50, 50));
-  ExpectFailure({"render", track, "--out", png, "--image", console_.Path("square.png")}, kFailed,
-                "the picture has 50 x 50 pixels, the track 270 x 480");
-  ExpectFailure({"render", Damaged(2, "?"), "--out", png}, kFailed, ":2: not valid JSON");
-  ExpectFailure({"render", track, "--out", folder_.Path("missing/a.png")}, kFailed,
-                "missing/a.png: cannot be written");
-}
-
-TEST_F(Cli, AFilmThatCannotBeMadeLeavesNothing) {
-  ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--size", "64x64", "--out",
-                 folder_.Path("missing/a.mp4")},
-                kFailed, "missing/a.mp4: cannot be written");
-  const std::string path = std::getenv("PATH");
-  setenv("PATH", folder_.Path("").c_str(), 1);
-  ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--size", "64x64", "--out",
-                 folder_.Path("a.mp4")},
-                kFailed, "a.mp4: films need the program ffmpeg, which cannot be started");
-  setenv("PATH", path.c_str(), 1);
 }
 
 }  // namespace

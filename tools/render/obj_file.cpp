@@ -23,7 +23,8 @@ class LineReader {
     std::string line;
     if (!std::getline(in_, line)) return false;
     ++number_;
-    words = std::istringstream(line);
+    words.clear();
+    words.str(line);
     return true;
   }
   [[noreturn]] void Fail(const std::string& sentence) const {

@@ -1,0 +1,113 @@
+// 'n3ds render' as its user meets it.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+
+#include "render/picture.h"
+#include "tool_test.h"
+
+namespace n3ds::tool {
+namespace {
+
+using ::testing::ElementsAre;
+
+using CliRender = ToolTest;
+
+TEST_F(CliRender, MakesAPicture) {
+  const Outcome outcome = Run({"render", ExampleTrack("real_head_move_90"), "--frame", "3",
+                               "--size", "320x320", "--out", folder_.Path("a.png")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  EXPECT_THAT(folder_.Names(), ElementsAre("a.png"));
+  const Picture picture = ReadPicture(folder_.Path("a.png"));
+  EXPECT_EQ(picture.width, 320);  // upright: 640 x 480
+  EXPECT_EQ(picture.height, 240);
+}
+
+TEST_F(CliRender, MakesAContactSheet) {
+  const Outcome outcome = Run({"render", ExampleTrack("synthetic_three"), "--contact-sheet", "6",
+                               "--size", "160x160", "--out", folder_.Path("sheet.png")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  const Picture picture = ReadPicture(folder_.Path("sheet.png"));
+  EXPECT_EQ((picture.width + 4) / 164 * ((picture.height + 4) / 94), 6);
+}
+
+TEST_F(CliRender, MakesAFolderOfFrames) {
+  const Outcome outcome = Run({"render", ExampleTrack("real_man_270_mirror"), "--every", "15",
+                               "--size", "64x64", "--out", folder_.Path("frames")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  std::vector<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(folder_.Path("frames"))) {
+    names.push_back(entry.path().filename());
+  }
+  std::sort(names.begin(), names.end());
+  EXPECT_THAT(names, ElementsAre("frame_000000.png", "frame_000015.png", "frame_000030.png"));
+}
+
+TEST_F(CliRender, MakesAFilm) {
+  const Outcome outcome = Run({"render", ExampleTrack("real_man_270_mirror"), "--every", "3",
+                               "--size", "99x99", "--out", folder_.Path("a.mp4")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  EXPECT_THAT(folder_.Names(), ElementsAre("a.mp4"));
+  EXPECT_THAT(folder_.Read("a.mp4").substr(4, 4), "ftyp");
+}
+
+TEST_F(CliRender, DrawsOverAPhoto) {
+  Picture photo(320, 320);
+  for (std::size_t i = 0; i < photo.rgba.size(); ++i) photo.rgba[i] = i % 4 == 3 ? 255 : 90;
+  WritePng(console_.Path("photo.png"), photo);
+  const Outcome outcome =
+      Run({"render", ExampleTrack("photo_astronaut"), "--image", console_.Path("photo.png"),
+           "--size", "320x320", "--out", folder_.Path("a.png")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  const Picture drawn = ReadPicture(folder_.Path("a.png"));
+  EXPECT_EQ(drawn.Pixel(5, 300)[0], 90);  // the ground is the photo
+  std::size_t changed = 0;
+  for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) changed += drawn.rgba[i] != 90 ? 1U : 0U;
+  EXPECT_GT(changed, 1000u);
+}
+
+TEST_F(CliRender, RefusesWhatItCannotDraw) {
+  const std::string track = ExampleTrack("real_man_270_mirror");
+  const std::string png = folder_.Path("a.png");
+  ExpectFailure({"render", track, "--out", png, "--frame", "999"}, kFailed,
+                "there is no frame 999");
+  ExpectFailure({"render", track, "--out", png, "--frame", "1", "--contact-sheet", "4"}, kFailed,
+                "exclude each other");
+  ExpectFailure({"render", track, "--out", folder_.Path("a.mp4"), "--frame", "1"}, kFailed,
+                "must end in .png");
+  for (const char* size : {"0x0", "100", "axb", "100x100x", "99999x10"}) {
+    ExpectFailure({"render", track, "--out", png, "--size", size}, kFailed, "--size ");
+  }
+  ExpectFailure({"render", track, "--out", png, "--image", track}, kFailed,
+                "neither a PNG nor a JPEG");
+  ExpectFailure({"render", track, "--out", png, "--image", folder_.Path("none.jpg")}, kFailed,
+                "none.jpg: the picture cannot be opened");
+  WritePng(console_.Path("square.png"), Picture(50, 50));
+  ExpectFailure({"render", track, "--out", png, "--image", console_.Path("square.png")}, kFailed,
+                "the picture has 50 x 50 pixels, the track 270 x 480");
+  ExpectFailure({"render", Damaged(2, "?"), "--out", png}, kFailed, ":2: not valid JSON");
+  ExpectFailure({"render", track, "--out", folder_.Path("missing/a.png")}, kFailed,
+                "missing/a.png: cannot be written");
+}
+
+TEST_F(CliRender, AFilmThatCannotBeMadeLeavesNothing) {
+  ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--size", "64x64", "--out",
+                 folder_.Path("missing/a.mp4")},
+                kFailed, "missing/a.mp4: cannot be written");
+  const std::string path = std::getenv("PATH");
+  setenv("PATH", folder_.Path("").c_str(), 1);
+  ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--size", "64x64", "--out",
+                 folder_.Path("a.mp4")},
+                kFailed, "a.mp4: films need the program ffmpeg, which cannot be started");
+  setenv("PATH", path.c_str(), 1);
+}
+
+TEST_F(CliRender, RefusesADamagedModel) {
+  ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--model",
+                 console_.Write("m.bin", "no model"), "--out", folder_.Path("a.png")},
+                kFailed, "m.bin: a face model has 2141796 bytes, this file has 8");
+}
+
+}  // namespace
+}  // namespace n3ds::tool
