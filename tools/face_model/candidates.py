@@ -1,7 +1,6 @@
 """Chooses the mesh vertices that serve as contour candidates: where outlines of heads run."""
 
 import numpy as np
-import scipy.sparse as sp
 from scipy.spatial import cKDTree
 
 import render
@@ -13,15 +12,6 @@ TEMPLES = 22.0  # mm above the tragions: the ends of the outline
 TOP = 32.0  # nodding heads bring skin above the temples to the outline's ends
 EAR = 11.0  # depth at which outlines end before the ear
 SEED = 534
-
-# Poses in which candidates are wanted, with their worth.
-YAWS = np.arange(-65.0, 65.1, 5.0)
-PITCH_WORTH = {0.0: 5.0, -12.0: 1.0, 12.0: 1.0, -24.0: 0.5, 24.0: 0.5}
-PEOPLE = 4
-FAR = 9.0  # mm on the skin; further along the view a candidate no longer stands for the place
-SKIN_WORTH = 0.05
-AGAIN = 0.02  # what is left of a demand once it is served
-
 
 # The skin on which outlines run, on the mean head: its lower end, the jaw's border, as height over
 # depth, and its inner end as distance from the middle over height (mm).
@@ -68,89 +58,32 @@ def silhouette(picture):
     return np.concatenate(out)
 
 
-def lower_edge(picture):
-    """Numbers of the lowest places, column by column, round the chin."""
-    column = np.round(picture[:, 0] / ROW).astype(int)
-    order = np.lexsort((picture[:, 1], column))
-    lowest = order[np.unique(column[order], return_index=True)[1]]
-    return lowest[np.abs(picture[lowest, 0] - picture[:, 0].mean()) < 45.0]
+def choose(points, mirror, must, never, wanted):
+    """`wanted` vertices, symmetric: `must` and their mirrors, and the rest where they do no harm.
 
-
-def demands(points, identity, fine_points, fine_identity):
-    """Outline places, and which vertices serve them: a sparse 0/1 matrix and a worth a row.
-
-    A vertex serves a place when it is within reach in the picture and not far along the view; a
-    second, smaller demand asks for one within reach on the skin.
-    """
-    rng = np.random.RandomState(SEED)
-    blocks, worths = [], []
-    for person in range(PEOPLE):
-        shape = rng.standard_normal(len(identity)) * (person > 0)
-        fine = fine_points + np.tensordot(shape, fine_identity, 1)
-        coarse = points + np.tensordot(shape, identity, 1)
-        tree = cKDTree(coarse)
-        for pitch, worth in PITCH_WORTH.items():
-            skin = np.flatnonzero(outline_skin(fine_points, TEMPLES if pitch == 0 else TOP))
-            for yaw in YAWS:
-                picture = seen_from(fine[skin], yaw, pitch)
-                flat = seen_from(coarse, yaw, pitch)
-                for rim, share in ((silhouette(picture), 1.0), (lower_edge(picture), 0.1)):
-                    rows, columns, skin_rows, skin_columns = [], [], [], []
-                    for k, close in enumerate(tree.query_ball_point(fine[skin[rim]], FAR)):
-                        close = np.array(close, int)
-                        offset = np.linalg.norm(flat[close] - picture[rim[k]], axis=1)
-                        serves = close[offset <= REACH]
-                        rows += [k] * len(serves)
-                        columns += serves.tolist()
-                        depth = np.linalg.norm(coarse[close] - fine[skin[rim[k]]], axis=1)
-                        serves = close[depth <= REACH]
-                        skin_rows += [k] * len(serves)
-                        skin_columns += serves.tolist()
-                    size = (len(rim), len(points))
-                    blocks.append(sp.csr_matrix((np.ones(len(rows)), (rows, columns)), size))
-                    blocks.append(sp.csr_matrix(
-                        (np.ones(len(skin_rows)), (skin_rows, skin_columns)), size))
-                    worths.append(np.full(len(rim), worth * share))
-                    worths.append(np.full(len(rim), worth * share * SKIN_WORTH))
-    return sp.vstack(blocks).tocsc(), np.concatenate(worths)
-
-
-def choose(points, serves, worth, mirror, must, never, wanted):
-    """`wanted` vertices, symmetric, that serve most: greedily the pair that adds most each time.
-
-    `must` are in, `never` are out. Vertices on the middle line come in twos, so that the number
-    stays even.
+    Candidates between the rows of the outline landmarks would let the landmarks slide along the
+    outline, so what the table has to spare lies where no outline and no edge of the hull comes
+    near. `never` are out. Vertices on the middle line come in twos, so that the number stays even.
     """
     chosen = set(must) | {int(mirror[v]) for v in must}
     barred = set(never) | {int(mirror[v]) for v in never}
     if chosen & barred:
         raise ValueError("a vertex is both wanted and barred")
     fitness = spare(points)
-    left = worth.copy()
-
-    def take(v):
-        chosen.add(v)
-        left[serves.indices[serves.indptr[v]:serves.indptr[v + 1]]] *= AGAIN
-
-    for v in sorted(chosen):
-        take(v)
+    alone = mirror == np.arange(len(mirror))
     odd = (wanted - len(chosen)) % 2
     while len(chosen) < wanted:
-        gain = np.round(serves.T @ left, 6)
-        gain = np.where(fitness > 0, gain + gain[mirror], np.round(fitness + fitness[mirror], 6))
+        gain = np.where(fitness > 0, -5.0, np.round(fitness + fitness[mirror], 6))
         gain[list(chosen | barred)] = -9.0
         room = wanted - len(chosen)
-        alone = mirror == np.arange(len(mirror))
         if odd and room == 1:
             gain[~alone] = -9.0
         elif room == 2 and not odd:
             gain[alone] = -9.0
         v = int(np.argmax(gain))
-        take(v)
+        chosen |= {v, int(mirror[v])}
         if alone[v]:
             odd = 1 - odd
-        else:
-            take(int(mirror[v]))
     return sorted(chosen)
 
 

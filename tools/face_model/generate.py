@@ -11,7 +11,6 @@ import numpy as np
 
 import candidates
 import domain
-import fields
 import measurements
 import nostril
 import numbering
@@ -20,7 +19,6 @@ import tables
 import tensor
 import topology
 import writer
-
 
 
 def build():
@@ -35,16 +33,13 @@ def build():
     mean, identity, expression = surface.modes(data, mesh, lifted)
     mean, identity, expression = (np.round(a, 5) for a in (mean, identity, expression))
 
-    cut = fields.subdivision_matrix(len(mean), mesh.triangles)
-    fine_identity = np.array([cut @ m for m in identity])
-    serves, worth = candidates.demands(mean, identity, lifted.points, fine_identity)
     owners = numbering.edge_owners(mesh.triangles)
     known = numbering.known_vertices(data, half, mesh, owners)
     table = set(tables.contour_candidates().tolist())
     must = [v for n, v in known.items() if n in table] + [
         v for row, v in half.rows if row == int(row)]
     never = [v for n, v in known.items() if n not in table]
-    chosen = candidates.choose(mean, serves, worth, mesh.mirror, must, never, len(table))
+    chosen = candidates.choose(mean, mesh.mirror, must, never, len(table))
     order, triangles = numbering.number(data, half, mesh, mean, chosen)
 
     names = data.expression_names
