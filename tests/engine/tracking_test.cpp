@@ -6,6 +6,7 @@
 #include <array>
 #include <cmath>
 #include <map>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -26,6 +27,7 @@ struct Bounds {
   double largest_degrees;
   double largest_jump_degrees;  // from one frame to the next, beyond what the head turned
 };
+void PrintTo(const Bounds& bounds, std::ostream* out) { *out << bounds.track; }
 
 // One face's estimate in the camera frame (x right, y down, z forward).
 struct Pose {
