@@ -106,7 +106,7 @@ void FillTasks(TrackingContext* context, int32_t face, const int16_t* products,
 
 // Queues all tasks and waits for every one, whatever becomes of the others: they use the records.
 MRESULT RunTasks(TrackingContext* context, void* pool, int32_t face_count) {
-  const auto task_count = static_cast<size_t>(kMeshTasksPerFace * face_count);
+  const auto task_count = static_cast<size_t>(face_count) * kMeshTasksPerFace;
   const ScratchArray<FaceMeshTask> tasks(context->memory, task_count);
   const ScratchArray<int32_t> ids(context->memory, task_count);
   const ScratchArray<int16_t> products(context->memory,

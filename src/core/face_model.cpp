@@ -39,7 +39,7 @@ int32_t LoadFaceModel(const uint8_t* data, size_t size, TrackingContext* context
       ReadInt32(data + 8) != kExpressionCount) {
     return N3DS_BAD_VALUE;
   }
-  const MHandle memory = context->memory;
+  void* const memory = context->memory;
   const Arrays arrays = {
       AllocateArray(memory, Layout::kMean), AllocateArray(memory, Layout::kIdentity),
       AllocateArray(memory, Layout::kExpression), AllocateArray(memory, Layout::kTensor)};

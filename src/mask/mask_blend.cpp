@@ -79,7 +79,7 @@ void BlendBgr24(const NSVL_OFFSCREEN& image, const NSVL_OFFSCREEN& mask,
       const uint8_t* over = Row(mask, 0, y) + 4 * x;
       uint8_t* out = Row(output, 0, y) + 3 * x;
       if (IsTransparent(over, pixels)) {
-        std::memmove(out, in, static_cast<size_t>(3 * pixels));
+        std::memmove(out, in, 3 * static_cast<size_t>(pixels));
         continue;
       }
       Load(over, pixels, &mask_strip);
