@@ -36,7 +36,9 @@ class File {
   explicit File(const std::vector<uint8_t>& bytes) : path_(::testing::TempDir() + Name()) {
     std::FILE* file = std::fopen(path_.c_str(), "wb");
     EXPECT_NE(file, nullptr);
-    EXPECT_EQ(std::fwrite(bytes.data(), 1, bytes.size(), file), bytes.size());
+    if (!bytes.empty()) {
+      EXPECT_EQ(std::fwrite(bytes.data(), 1, bytes.size(), file), bytes.size());
+    }
     std::fclose(file);
   }
   ~File() { std::remove(path_.c_str()); }
