@@ -1,4 +1,4 @@
-// n3ds model info: what is in a face-model file, and whether it can serve.
+// n3ds model, and n3ds model info: what is in a face-model file, and whether it can serve.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "commands/commands.h"
+#include "commands/model_commands.h"
 #include "engine/face_model_file.h"
 #include "support/error.h"
 
@@ -136,21 +137,29 @@ void RunModelInfo(const std::string& path) {
 }  // namespace
 
 void AddModelCommand(CLI::App& app) {
-  CLI::App* command = app.add_subcommand("model", "Looks at face-model files.");
+  CLI::App* command =
+      app.add_subcommand("model", "Looks at face-model files, checks, draws and exports them.");
   command->require_subcommand(1);
   CLI::App* info = command->add_subcommand(
       "info", "Prints counts, ranges and sizes of a face-model file and whether it is usable.");
   const auto path = std::make_shared<std::string>();
   info->add_option("file", *path, "Face-model file")->required()->type_name("FILE");
-  const char* const footer =
+  info->footer(
       "The box is given as stored (pitched by 20 degrees) and in the upright frame of the "
       "engine's\n"
       "model matrix. The exit code is 1 for a file that is not usable.\n"
       "Example:\n"
-      "  n3ds model info data/face_model.bin";
-  info->footer(footer);
-  command->footer(footer);
+      "  n3ds model info data/face_model.bin");
   info->callback([path] { RunModelInfo(*path); });
+  AddModelCheckCommand(*command);
+  AddModelRenderCommand(*command);
+  AddModelExportCommand(*command);
+  command->footer(
+      "Examples:\n"
+      "  n3ds model info data/face_model.bin\n"
+      "  n3ds model check data/face_model.bin\n"
+      "  n3ds model render data/face_model.bin --out face.png\n"
+      "  n3ds model export data/face_model.bin --obj face.obj");
 }
 
 }  // namespace n3ds::tool

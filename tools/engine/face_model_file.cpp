@@ -72,16 +72,18 @@ FaceModelFile ReadFaceModelFile(const std::string& path) {
   return model;
 }
 
-std::vector<Point3> MeanFace(const FaceModelFile& model) {
+Point3 UprightPoint(const std::int16_t* stored) {
   constexpr double kCosTilt = 0.9397;
   constexpr double kSinTilt = 0.342;
+  const double x = stored[0] / 256.0;
+  const double y = stored[1] / 256.0;
+  const double z = stored[2] / 256.0;
+  return {x, kCosTilt * y - kSinTilt * z, kSinTilt * y + kCosTilt * z};
+}
+
+std::vector<Point3> MeanFace(const FaceModelFile& model) {
   std::vector<Point3> points(kModelVertices);
-  for (std::size_t v = 0; v < kModelVertices; ++v) {
-    const double x = model.mean[3 * v] / 256.0;
-    const double y = model.mean[3 * v + 1] / 256.0;
-    const double z = model.mean[3 * v + 2] / 256.0;
-    points[v] = {x, kCosTilt * y - kSinTilt * z, kSinTilt * y + kCosTilt * z};
-  }
+  for (std::size_t v = 0; v < kModelVertices; ++v) points[v] = UprightPoint(&model.mean[3 * v]);
   return points;
 }
 

@@ -27,8 +27,11 @@ FaceModelFile ReadFaceModelFile(const std::string& path);
 
 using Point3 = std::array<double, 3>;
 
-// The mean face in the frame of the engine's model matrix, mm: the file's shape is pitched by 20
-// degrees, which the engine's output takes back.
+// A coordinate triple of the file in the frame of the engine's model matrix, mm: the file's shape
+// is pitched by 20 degrees, which the engine's output takes back.
+Point3 UprightPoint(const std::int16_t* stored);
+
+// The mean face in the frame of the engine's model matrix, mm.
 std::vector<Point3> MeanFace(const FaceModelFile& model);
 
 }  // namespace n3ds::tool

@@ -84,9 +84,9 @@ Mesh Arrow(const std::array<float, 3>& start, std::size_t axis, const Material& 
 
 }  // namespace
 
-Mesh FaceMesh(const FaceModelFile& model) {
+Mesh FaceMesh(const std::vector<Point3>& points) {
   Mesh mesh;
-  for (const Point3& p : MeanFace(model)) {
+  for (const Point3& p : points) {
     mesh.vertices.push_back(
         {{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2])}, {}});
   }
@@ -97,6 +97,8 @@ Mesh FaceMesh(const FaceModelFile& model) {
   mesh.parts.push_back({kSkin, 0, mesh.indices.size()});
   return mesh;
 }
+
+Mesh FaceMesh(const FaceModelFile& model) { return FaceMesh(MeanFace(model)); }
 
 Mesh SkullMesh() {
   // The ellipsoid passes a millimetre under the forehead of the mean face and has the length and

@@ -1,10 +1,15 @@
 // Meshes made by formula: the head under the stickers and the coordinate tripod.
 #pragma once
 
+#include <vector>
+
 #include "engine/face_model_file.h"
 #include "render/mesh.h"
 
 namespace n3ds::tool {
+
+// A face of the model's mesh with its vertices at `points`, 1,812 of them.
+Mesh FaceMesh(const std::vector<Point3>& points);
 
 // The mean face of the model in the frame of the model matrix.
 Mesh FaceMesh(const FaceModelFile& model);
