@@ -95,8 +95,8 @@ class Obj:
     def tube(self, path, across, half_width, half_height, mirror=False, closed=False):
         """A bar with rounded edges along a path.
 
-        across: for each point of the path the direction of the width; half_width and half_height are
-        numbers or one number a point.
+        across: for each point of the path the direction of the width; half_width and half_height
+        are numbers or one number a point.
         """
         sides = 8
         rows = []
@@ -104,7 +104,8 @@ class Obj:
             after = path[(i + 1) % len(path)] if closed else path[min(i + 1, len(path) - 1)]
             before = path[i - 1] if closed or i > 0 else p
             tangent = unit(sub(after, before))
-            side = unit(sub(across[i], scale(tangent, sum(a * t for a, t in zip(across[i], tangent)))))
+            along = sum(a * t for a, t in zip(across[i], tangent))
+            side = unit(sub(across[i], scale(tangent, along)))
             up = cross(tangent, side)
             w = half_width[i] if isinstance(half_width, list) else half_width
             h = half_height[i] if isinstance(half_height, list) else half_height
@@ -165,14 +166,15 @@ def glasses():
     angles = [2 * math.pi * i / steps for i in range(steps)]
     rim = [rim_point(a) for a in angles]
     obj.use("frame")
-    obj.tube(rim, [(0, 0, 1)] * steps, 2.0, [1.7 + 0.8 * smooth(-0.2, 0.9, math.sin(a)) for a in angles],
-             mirror=True, closed=True)
+    heights = [1.7 + 0.8 * smooth(-0.2, 0.9, math.sin(a)) for a in angles]
+    obj.tube(rim, [(0, 0, 1)] * steps, 2.0, heights, mirror=True, closed=True)
 
     # Bridge: from rim to rim over the nose.
     arc = []
     for i in range(13):
         x = -10.5 + 21.0 * i / 12
-        arc.append((x, 29.5 + 2.2 * math.cos(math.pi * x / 21), 101.0 + 0.8 * math.cos(math.pi * x / 21)))
+        bow = math.cos(math.pi * x / 21)
+        arc.append((x, 29.5 + 2.2 * bow, 101.0 + 0.8 * bow))
     obj.tube(arc, [(0, 0, 1)] * len(arc), 1.8, 2.2)
 
     # Temples: from the rim's outer corner round the hinge back over the ear and down behind it.
@@ -182,12 +184,14 @@ def glasses():
             (77.6, -9.0, -22.0)]
     path = resampled(path, 28)
     across = [(1, 0, 0) if p[2] < 80 else unit((1, 0, 0.9)) for p in path]
-    heights = [3.4 - 1.4 * smooth(0, 0.35, i / 27) + 0.7 * smooth(0.75, 1, i / 27) for i in range(28)]
+    heights = [3.4 - 1.4 * smooth(0, 0.35, i / 27) + 0.7 * smooth(0.75, 1, i / 27)
+               for i in range(28)]
     obj.tube(path, across, 1.2, heights, mirror=True)
 
     # Nose pads.
     obj.use("metal")
-    pad = resampled([(9.2, 23.0, 99.0), (9.8, 21.0, 95.5), (10.6, 17.5, 94.5), (11.6, 14.0, 96.0)], 9)
+    pad = [(9.2, 23.0, 99.0), (9.8, 21.0, 95.5), (10.6, 17.5, 94.5), (11.6, 14.0, 96.0)]
+    pad = resampled(pad, 9)
     obj.tube(pad, [(1, 0, 0.5)] * 9, 0.8, 1.5, mirror=True)
 
     # Lenses, a fan of rings around the middle; slightly domed.

@@ -14,8 +14,8 @@ TILT = 20.0  # degrees between the model file's frame and the upright head
 
 # Back of the head behind the measured profile, as (z, y) from the neck's front over the nape to the
 # hairline: drawn, not measured.
-BACK = [(50, -140), (-62, -140), (-58, -75), (-80, -25), (-95, 30), (-82, 90), (-40, 128), (20, 134),
-        (64, 114)]
+BACK = [(50, -140), (-62, -140), (-58, -75), (-80, -25), (-95, 30), (-82, 90), (-40, 128),
+        (20, 134), (64, 114)]
 
 
 def _pixel_grid(picture, left, top):
@@ -97,7 +97,8 @@ def _draw_head(picture, at, scale, turn=0.0):
         return (at[0] - z * scale, at[1] - y * scale)
 
     eye = face.EYES[1]
-    picture.polygon(face.curve([spot(points[k]) for k in eye], closed=True), canvas.WHITE, LINE, 1.5)
+    rim = face.curve([spot(points[k]) for k in eye], closed=True)
+    picture.polygon(rim, canvas.WHITE, LINE, 1.5)
     picture.dot(spot(points[96]), 4 * scale + 1, canvas.INK)
     picture.line(face.curve([spot(points[k]) for k in range(29, 35)]), LINE, 3)
     picture.line(face.curve([spot(points[k]) for k in (70, 71, 72)]), LINE, 1.5)

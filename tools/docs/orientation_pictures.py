@@ -75,7 +75,8 @@ def _to_upright(point, degree, mirror, size):
     width, height = size
     if mirror:
         x = width - x
-    return {0: (x, y), 90: (height - y, x), 180: (width - x, height - y), 270: (y, width - x)}[degree]
+    places = {0: (x, y), 90: (height - y, x), 180: (width - x, height - y), 270: (y, width - x)}
+    return places[degree]
 
 
 def _deliver(picture, degree, mirror):

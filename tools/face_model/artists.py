@@ -7,6 +7,7 @@ data/face_template.png  the texture's layers in one picture, 2048 x 2048
 data/template/*.png     the layers: mask_area, feature_lines, wireframe, landmark_numbers
 """
 
+import argparse
 from pathlib import Path
 
 import numpy as np
@@ -14,7 +15,7 @@ from PIL import Image, ImageDraw
 
 import measurements
 import tables
-from check import Model
+from shipped import Model
 from triangulate import boundary_edges, edge_owners
 
 SIZE = 2048
@@ -117,13 +118,17 @@ def layers(model):
 
 
 def main():
-    data = measurements.DATA
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--data", type=Path, default=measurements.DATA,
+                        help="folder with the model, to which the files are added")
+    data = parser.parse_args().data
     model = Model(data)
     write_obj(data / "face.obj", "Mean face, upright head frame: x image right, y up, z out; mm.",
               model.mean, model.triangles, model.texture)
     points, triangles = occluder(model)
-    write_obj(data / "head_occluder.obj", "Head occluder, same frame as face.obj.", points, triangles)
-    folder = Path(data / "template")
+    write_obj(data / "head_occluder.obj", "Head occluder, same frame as face.obj.",
+              points, triangles)
+    folder = data / "template"
     folder.mkdir(exist_ok=True)
     whole = Image.new("RGBA", (SIZE, SIZE), (255, 255, 255, 255))
     made = layers(model)

@@ -16,7 +16,8 @@ SEED = 534
 # The skin on which outlines run, on the mean head: its lower end, the jaw's border, as height over
 # depth, and its inner end as distance from the middle over height (mm).
 JAW_BORDER = np.array([(8, -44), (18, -51), (32, -66.5), (51, -79.5), (70, -85.5), (86, -90.5)])
-INNER_END = np.array([(-92, 0), (-86, 14), (-80, 27), (-68, 32), (-30, 33), (5, 44), (24, 50), (60, 50)])
+INNER_END = np.array(
+    [(-92, 0), (-86, 14), (-80, 27), (-68, 32), (-30, 33), (5, 44), (24, 50), (60, 50)])
 
 
 def outline_skin(points, top=TEMPLES):

@@ -61,7 +61,8 @@ def with_nostrils(data):
         normals=np.vstack([data.normals, np.zeros((2 * count, 3))]),
         region=np.concatenate([np.where(hidden, "left_out", data.region), region, region]),
         landmark=np.concatenate([data.landmark, np.full(2 * count, -1)]),
-        mirror=np.concatenate([data.mirror, old + count + np.arange(count), old + np.arange(count)]),
+        mirror=np.concatenate(
+            [data.mirror, old + count + np.arange(count), old + np.arange(count)]),
         identity=blank(data.identity),
         expression=blank(data.expression),
         measured=np.concatenate([np.ones(old, bool), np.zeros(2 * count, bool)]),

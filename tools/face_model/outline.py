@@ -8,7 +8,8 @@ nothing. Two further rows lie between each two, so that no part of an outline is
 
 import numpy as np
 
-# Landmark, and the ends of its row at image left on the mean head (mm): before the ear, on the cheek.
+# Landmark, and the ends of its row at image left on the mean head (mm): before the ear, on the
+# cheek.
 ROWS = [
     (0, (-76.5, 21.0, 15.0), (-54.0, 20.0, 70.0)),
     (1, (-75.0, 3.5, 15.0), (-46.0, 3.0, 78.0)),

@@ -5,8 +5,8 @@ import numpy as np
 
 import measurements
 import tables
-from check import Model
 from render import draw, row, save, turned
+from shipped import Model
 
 FOLDER = measurements.DATA.parent / "docs" / "face-model"
 CENTRE = np.array([0.0, -5.0, 50.0])

@@ -42,7 +42,10 @@ def _gradient_operator(points, triangles):
 
 
 def lid_contacts(face, upper, lower):
-    """For each upper rim vertex the place on the lower rim where it rests: two vertices, a share."""
+    """For each upper rim vertex the place on the lower rim where it rests.
+
+    As (vertex, two vertices of the lower rim, share of the way between them).
+    """
     out = []
     for v in upper:
         best = None

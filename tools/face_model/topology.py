@@ -27,7 +27,8 @@ NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 307, 311, 314, 308, 295, 299
 BROW_POINTS = list(range(19, 29))
 LEAST_DISTANCE = 3.6  # mm between the vertices along outlines and other fixed ones
 LID_RING = 24  # vertices round the eye; they come first
-INNER_POINTS = list(range(0, 9)) + list(range(19, 29)) + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86]
+INNER_POINTS = (list(range(0, 9)) + list(range(19, 29))
+                + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86])
 
 
 @dataclass

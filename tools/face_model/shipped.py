@@ -1,0 +1,24 @@
+"""The model in data/, read back for the checker, the artists' files and the pictures."""
+
+import re
+
+import numpy as np
+
+import writer
+
+
+class Model:
+    """The files of data/, back in the upright head frame and in standard deviations."""
+
+    def __init__(self, folder):
+        raw = writer.read_model(folder / "face_model.bin")
+        untilt = np.linalg.inv(writer.TILT)
+        self.mean, identity, self.expression = (block @ untilt.T for block in raw[:3])
+        self.identity = identity / writer.IDENTITY_UNIT
+        steps = raw[3].astype(float) * writer.TENSOR_STEP / writer.FIXED_POINT
+        self.tensor = steps @ untilt.T / writer.IDENTITY_UNIT
+        text = (folder / "triangles.inc").read_text().split("\n", 1)[1]
+        self.triangles = np.array(re.findall(r"\d+", text), int).reshape(-1, 3)
+        text = (folder / "texture_coordinates.inc").read_text().split("\n", 1)[1]
+        self.texture = np.array(re.findall(r"([\d.]+)f", text), float).reshape(-1, 2)
+        self.names = re.findall(r'"(\w+)"', (folder / "expression_names.inc").read_text())
