@@ -1,8 +1,9 @@
 // OpenCV's solvePnP on the frames of tracks with truth, judged by the same code as 'n3ds eval' and
 // printed beside the engine: mean landmark positions of the population, iterative solver, each
-// person's last pose as the start of the next frame, the engine's assumption of the focal length.
+// person's last pose as the start of the next frame, the engine's assumption of the focal length;
+// each with and without a one-euro filter on the pose.
 //
-//   solve_pnp_peer FILE.track.jsonl...
+//   solve_pnp_peer [--model FILE] FILE.track.jsonl...
 #include <chrono>
 #include <cstdint>
 #include <cstdio>
@@ -15,9 +16,11 @@
 #include <string>
 #include <vector>
 
+#include "attachment.h"
 #include "engine/engine_session.h"
 #include "eval/metrics.h"
 #include "eval/score_table.h"
+#include "one_euro_pose.h"
 #include "support/error.h"
 #include "support/statistics.h"
 #include "tracks/track_file.h"
@@ -119,8 +122,8 @@ Run RunPnp(const Track& track, const std::vector<cv::Point3d>& mean, const Selec
   return run;
 }
 
-Run RunEngine(const Track& track) {
-  const auto results = RunTrack(track, DefaultModelPath(), TrackMode::kRigid);
+Run RunEngine(const Track& track, const std::string& model) {
+  const auto results = RunTrack(track, model, TrackMode::kRigid);
   Run run;
   run.poses = CameraPoses(track, results);
   for (std::size_t f = 0; f < results.size(); ++f) {
@@ -129,53 +132,146 @@ Run RunEngine(const Track& track) {
   return run;
 }
 
-void Print(const char* name, const std::vector<Track>& tracks, const std::vector<Run>& runs) {
+std::vector<JudgedTrack> Judged(const std::vector<Track>& tracks, const std::vector<Run>& runs) {
   std::vector<JudgedTrack> judged;
-  std::vector<double> milliseconds;
   for (std::size_t k = 0; k < tracks.size(); ++k) {
     judged.push_back({&tracks[k], &runs[k].poses, EngineFocal(tracks[k].header)});
-    milliseconds.insert(milliseconds.end(), runs[k].milliseconds.begin(),
-                        runs[k].milliseconds.end());
   }
-  const HeadFrameOffset offset = EstimateOffset(judged);
-  NamedScores scores;
-  for (const JudgedTrack& one : judged) {
-    scores.emplace_back(one.track->name, ScoreTrack(one, offset));
-  }
-  std::cout << name << ", " << Decimal(Percentile(milliseconds, 0.5), 3)
-            << " ms a frame (median)\n";
-  ScoreTable(scores).Print(std::cout);
-  std::cout << "\n";
+  return judged;
 }
 
-void RunPeer(const std::vector<std::string>& paths) {
+// Rotation errors that are left when every person's own mean error is taken off: what the
+// person's unknown shape does not explain.
+std::vector<double> OwnRotationErrors(const std::vector<JudgedTrack>& tracks) {
+  std::vector<double> errors;
+  for (const JudgedTrack& judged : tracks) {
+    std::map<std::int64_t, std::vector<Matrix3>> people;
+    const std::vector<TrackFrame>& frames = judged.track->frames;
+    for (std::size_t f = 0; f < frames.size(); ++f) {
+      for (std::size_t i = 0; i < frames[f].faces.size(); ++i) {
+        const PoseEstimate& pose = (*judged.poses)[f][i];
+        if (!pose.valid) continue;
+        const TrackFace& face = frames[f].faces[i];
+        people[face.id].push_back(Multiplied(Transposed(face.truth->rotation), pose.rotation));
+      }
+    }
+    for (const auto& [id, rotations] : people) {
+      const Matrix3 mean = Transposed(MeanRotation(rotations));
+      for (const Matrix3& r : rotations) errors.push_back(RotationAngle(Multiplied(mean, r)));
+    }
+  }
+  return errors;
+}
+
+class Comparison {
+ public:
+  Comparison(const std::vector<Track>& tracks, const std::vector<cv::Point3d>& mean)
+      : tracks_(tracks),
+        summary_({"", "rot20", "p95", "rot40", "p95", "rot60", "p95", "own", "attach", "p95",
+                  "depth", "p95", "jitter", "p95", "lag"}) {
+    for (const cv::Point3d& p : mean) mean_.push_back({p.x, p.y, p.z});
+  }
+
+  // Prints the tracks one by one and keeps the sum for the summary.
+  void Add(const std::string& name, const std::vector<Run>& runs) {
+    const std::vector<JudgedTrack> judged = Judged(tracks_, runs);
+    const HeadFrameOffset offset = EstimateOffset(judged);
+    NamedScores scores;
+    Score all;
+    AttachmentScore attachment;
+    std::vector<double> milliseconds;
+    for (std::size_t k = 0; k < judged.size(); ++k) {
+      scores.emplace_back(tracks_[k].name, ScoreTrack(judged[k], offset));
+      all.Add(scores.back().second);
+      AddAttachment(judged[k], mean_, attachment);
+      milliseconds.insert(milliseconds.end(), runs[k].milliseconds.begin(),
+                          runs[k].milliseconds.end());
+    }
+    std::cout << name << ", " << Decimal(Percentile(milliseconds, 0.5), 3)
+              << " ms a frame (median)\n";
+    ScoreTable(scores).Print(std::cout);
+    std::cout << "\n";
+    Summarize(name, all, OwnRotationErrors(judged), attachment);
+  }
+
+  void PrintSummary() const { summary_.Print(std::cout); }
+
+ private:
+  void Summarize(const std::string& name, const Score& score, const std::vector<double>& own,
+                 const AttachmentScore& attachment) {
+    std::vector<std::string> row = {name};
+    const auto add = [&](const std::vector<double>& sample, int decimals) {
+      row.push_back(Decimal(Percentile(sample, 0.5), decimals));
+      row.push_back(Decimal(Percentile(sample, 0.95), decimals));
+    };
+    for (const double yaw : {20, 40, 60}) add(score.RotationErrors(yaw), 2);
+    row.push_back(Decimal(Percentile(own, 0.5), 2));
+    add(attachment.errors, 2);
+    std::vector<double> depth;
+    for (const PoseError& error : score.errors) depth.push_back(error.depth);
+    add(depth, 1);
+    add(attachment.jitter, 2);
+    row.push_back(Decimal(1000 * score.Lag(), 1));
+    summary_.AddRow(row);
+  }
+
+  const std::vector<Track>& tracks_;
+  std::vector<Vector3> mean_;
+  TextTable summary_;
+};
+
+constexpr char kSummaryLegend[] =
+    "All tracks together.\n"
+    "rot20..    as above\n"
+    "own        rotation error, median, when every person's own mean error is taken off as well\n"
+    "attach     offset of points on the nose bridge, above the forehead and in front of the ears,\n"
+    "           percent of the pupils' distance; nothing is taken off\n"
+    "depth      as above\n"
+    "jitter     second difference of these points less the true ones', pixels at a face width of\n"
+    "           200\n"
+    "lag        by which the rotation trails the true one, ms\n";
+
+void RunPeer(const std::string& model, const std::vector<std::string>& paths) {
   const auto mean = ReadMeanLandmarks(N3DS_DATA_DIR "/face_statistics/points.csv");
   std::vector<Track> tracks;
   for (const std::string& path : paths) {
     tracks.push_back(ReadTrackFile(path));
     if (!tracks.back().HasTruth()) throw Error(path + ": the track has no truth");
   }
+  Comparison comparison(tracks, mean);
   std::vector<Run> runs;
-  for (const Track& track : tracks) runs.push_back(RunEngine(track));
-  Print("engine, rigid", tracks, runs);
+  for (const Track& track : tracks) runs.push_back(RunEngine(track, model));
+  comparison.Add("engine, rigid", runs);
   for (const Selection& selection : kSelections) {
     runs.clear();
     for (const Track& track : tracks) runs.push_back(RunPnp(track, mean, selection));
-    Print(selection.name, tracks, runs);
+    comparison.Add(selection.name, runs);
+    for (std::size_t k = 0; k < runs.size(); ++k) {
+      runs[k].poses = Filtered(tracks[k], runs[k].poses);
+    }
+    comparison.Add(std::string(selection.name) + ", one-euro", runs);
   }
-  std::cout << kScoreTableLegend;
+  std::cout << kScoreTableLegend << "\n";
+  comparison.PrintSummary();
+  std::cout << "\n" << kSummaryLegend;
 }
 
 }  // namespace
 }  // namespace n3ds::tool
 
 int main(int argc, char** argv) {
-  if (argc < 2) {
-    std::fputs("usage: solve_pnp_peer FILE.track.jsonl...\n", stderr);
+  std::vector<std::string> arguments(argv + 1, argv + argc);
+  std::string model = n3ds::tool::DefaultModelPath();
+  if (arguments.size() > 1 && arguments[0] == "--model") {
+    model = arguments[1];
+    arguments.erase(arguments.begin(), arguments.begin() + 2);
+  }
+  if (arguments.empty()) {
+    std::fputs("usage: solve_pnp_peer [--model FILE] FILE.track.jsonl...\n", stderr);
     return 2;
   }
   try {
-    n3ds::tool::RunPeer(std::vector<std::string>(argv + 1, argv + argc));
+    n3ds::tool::RunPeer(model, arguments);
   } catch (const std::exception& error) {
     std::fprintf(stderr, "solve_pnp_peer: %s\n", error.what());
     return 1;
