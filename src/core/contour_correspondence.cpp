@@ -4,6 +4,7 @@
 
 #include "core/convex_hull.h"
 #include "core/model_tables.h"
+#include "core/nearest_candidate.h"
 #include "math/integer_arithmetic.h"
 #include "platform/scratch_array.h"
 
@@ -16,11 +17,7 @@ namespace {
 constexpr double kProbeSpacing = 0.3;
 constexpr float kLongestProbedEdge = 8.0f;
 
-// The candidates searched for every probe; the last two of the table are taken only near the hull
-// vertex from which the probe started.
-constexpr int kSearchedCandidates = 532;
-constexpr int kSearchLanes = 4;
-static_assert(kSearchedCandidates % kSearchLanes == 0);
+// The last two of the table are taken only near the hull vertex from which the probe started.
 static_assert(kSearchedCandidates + 2 == kContourCandidateCount);
 
 int32_t SquaredDistance(int32_t x0, int32_t y0, int32_t x1, int32_t y1) {
@@ -72,40 +69,18 @@ int32_t ProbeCoordinate(int32_t a, int32_t b, int32_t j, int32_t n) {
 }
 
 // The candidate that a probe at (x, y) on an edge starting at hull vertex `a` snaps to.
-int32_t SnapProbe(const HullPoint* candidates, const HullPoint& a, int32_t x, int32_t y) {
+int32_t SnapProbe(const HullPoint* candidates, NearestCandidateSearch* search, const HullPoint& a,
+                  int32_t x, int32_t y) {
   const int32_t start_distance = SquaredDistance(a.x, a.y, x, y);
-  // Four interleaved searches, each keeping the last of equal distances; merged in order below. The
-  // tie order is part of the result.
-  int32_t lane_distance[kSearchLanes];
-  int32_t lane_candidate[kSearchLanes];
-  for (int lane = 0; lane < kSearchLanes; lane++) {
-    lane_distance[lane] = start_distance;
-    lane_candidate[lane] = a.index;
-  }
-  for (int32_t n = 0; n < kSearchedCandidates; n += kSearchLanes) {
-    for (int lane = 0; lane < kSearchLanes; lane++) {
-      const HullPoint& candidate = candidates[n + lane];
-      const int32_t distance = SquaredDistance(candidate.x, candidate.y, x, y);
-      const bool nearer = distance <= lane_distance[lane];
-      lane_distance[lane] = nearer ? distance : lane_distance[lane];
-      lane_candidate[lane] = nearer ? n + lane : lane_candidate[lane];
-    }
-  }
-  int32_t best_distance = start_distance;
-  int32_t best = a.index;
-  for (int lane = 0; lane < kSearchLanes; lane++) {
-    if (lane_distance[lane] < best_distance) {
-      best_distance = lane_distance[lane];
-      best = lane_candidate[lane];
-    }
-  }
+  const FoundCandidate found = search->Find(x, y, {a.index, start_distance});
+  int32_t best = found.candidate;
   // Both of the last two are compared with the best of the search, not with each other.
   const int32_t reach = TruncateToInt32(std::sqrt(static_cast<double>(start_distance)));
   for (int32_t n = kSearchedCandidates; n < kContourCandidateCount; n++) {
     const HullPoint& candidate = candidates[n];
     if (WrapAbs(WrapSubtract(candidate.x, x)) < reach &&
         WrapAbs(WrapSubtract(candidate.y, y)) < reach &&
-        SquaredDistance(candidate.x, candidate.y, x, y) < best_distance) {
+        SquaredDistance(candidate.x, candidate.y, x, y) < found.squared_distance) {
       best = n;
     }
   }
@@ -140,14 +115,18 @@ int64_t UpdateContourCorrespondence(MHandle memory, const int32_t* landmarks, co
   }
   const ScratchArray<int32_t> probes(memory, static_cast<size_t>(probe_count) + 1);
   if (!probes) return N3DS_NO_MEMORY;
+  NearestCandidateSearch search(candidates.get());
   int32_t filled = 0;
   for (int32_t i = 0; i + 1 < hull_count; i++) {
     const HullPoint& a = hull[i];
     const HullPoint& b = hull[i + 1];
     const int32_t n = ProbeCount(a, b, spacing);
     for (int32_t j = 1; j <= n; j++) {
-      probes[filled++] = SnapProbe(candidates.get(), a, ProbeCoordinate(a.x, b.x, j, n),
-                                   ProbeCoordinate(a.y, b.y, j, n));
+      const int32_t candidate =
+          SnapProbe(candidates.get(), &search, a, ProbeCoordinate(a.x, b.x, j, n),
+                    ProbeCoordinate(a.y, b.y, j, n));
+      // Neighbouring probes often snap to the same candidate; the second one changes nothing below.
+      if (filled == 0 || probes[filled - 1] != candidate) probes[filled++] = candidate;
     }
   }
 
@@ -164,7 +143,7 @@ int64_t UpdateContourCorrespondence(MHandle memory, const int32_t* landmarks, co
       }
     };
     for (int32_t i = 1; i < hull_count; i++) consider(hull[i]);
-    for (int32_t i = 0; i < probe_count; i++) consider(candidates[probes[i]]);
+    for (int32_t i = 0; i < filled; i++) consider(candidates[probes[i]]);
     correspondence[landmark] = kContourCandidateVertexIndices[best];
   }
   return N3DS_OK;
