@@ -1,5 +1,5 @@
-// One rigid frame, whole and by its parts: matching, pose fit, contour. What the task pool costs is
-// in task_pool_bench.
+// One rigid frame, whole and by its parts: matching, pose fit, contour; and one mask frame. What
+// the task pool costs is in task_pool_bench.
 #include <benchmark/benchmark.h>
 
 #include <vector>
@@ -9,6 +9,7 @@
 #include "core/pose_fitting.h"
 #include "core/pose_rounds.h"
 #include "synthetic_face.h"
+#include "tracked_faces.h"
 
 namespace {
 
@@ -41,29 +42,71 @@ std::vector<float> MeanShape() {
   return shape;
 }
 
-void RigidFrame(benchmark::State& state) {
-  const int face_count = static_cast<int>(state.range(0));
-  auto frames = Frames(face_count);
+// An engine with a picture to process and room for its results.
+struct Host {
   void* engine = Norvale_3DSticker_CreateEngine();
-  Norvale_3DSticker_InitializeEx(engine, Model().data(), static_cast<uint32_t>(Model().size()), 0,
-                                 0);
   NSVL_OFFSCREEN image = {};
-  image.width = kWidth;
-  image.height = kHeight;
-  static float landmarks_3d[N3DS_MAX_FACES][3 * 101];
-  static Norvale_3DSticker_Matrix_Array out;
-  for (int k = 0; k < N3DS_MAX_FACES; k++) out.faces[k].landmarks3D = landmarks_3d[k];
+  Norvale_3DSticker_Matrix_Array matrices = {};
+  Norvale_3DSticker_ModelInfo_Array models = {};
+  float landmarks_3d[N3DS_MAX_FACES][3 * 101];
+
+  Host() {
+    Norvale_3DSticker_InitializeEx(engine, Model().data(), static_cast<uint32_t>(Model().size()), 0,
+                                   0);
+    image.width = kWidth;
+    image.height = kHeight;
+    for (int k = 0; k < N3DS_MAX_FACES; k++) matrices.faces[k].landmarks3D = landmarks_3d[k];
+  }
+  ~Host() { Norvale_3DSticker_DestroyEngine(engine); }
+  Host(const Host&) = delete;
+  Host& operator=(const Host&) = delete;
+};
+
+void RigidFrame(benchmark::State& state) {
+  const auto face_count = static_cast<uint32_t>(state.range(0));
+  auto frames = Frames(static_cast<int>(face_count));
+  Host host;
   size_t frame = 0;
   for (auto _ : state) {
     const MRESULT result =
-        Norvale_3DSticker_Process(engine, &image, static_cast<uint32_t>(face_count), 101,
-                                  frames[frame].data(), nullptr, nullptr, &out);
+        Norvale_3DSticker_Process(host.engine, &host.image, face_count, 101, frames[frame].data(),
+                                  nullptr, nullptr, &host.matrices);
     if (result != N3DS_OK) state.SkipWithError("frame failed");
     frame = (frame + 1) % frames.size();
   }
-  Norvale_3DSticker_DestroyEngine(engine);
 }
-BENCHMARK(RigidFrame)->Arg(1)->Arg(3)->Arg(5)->Unit(benchmark::kMicrosecond)->UseRealTime();
+BENCHMARK(RigidFrame)
+    ->Arg(1)
+    ->Arg(3)
+    ->Arg(5)
+    ->Unit(benchmark::kMicrosecond)
+    ->MeasureProcessCPUTime()
+    ->UseRealTime();
+
+// Faces of the example tracks, with expressions and noise.
+void MaskFrame(benchmark::State& state) {
+  static_assert(kWidth == n3ds::bench::kTrackWidth && kHeight == n3ds::bench::kTrackHeight);
+  const auto face_count = static_cast<uint32_t>(state.range(0));
+  auto frames = n3ds::bench::FramesWithFaces(static_cast<int>(face_count));
+  Host host;
+  size_t frame = 0;
+  for (auto _ : state) {
+    const MRESULT result = Norvale_3DSticker_Process_FaceMask(
+        host.engine, &host.image, face_count, 101, frames[frame].points.data(), nullptr, nullptr,
+        &host.matrices, &host.models);
+    if (result != N3DS_OK || host.models.modelNum != face_count) {
+      state.SkipWithError("frame failed");
+    }
+    frame = (frame + 1) % frames.size();
+  }
+}
+BENCHMARK(MaskFrame)
+    ->Arg(1)
+    ->Arg(3)
+    ->Arg(5)
+    ->Unit(benchmark::kMicrosecond)
+    ->MeasureProcessCPUTime()
+    ->UseRealTime();
 
 void Matching(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));

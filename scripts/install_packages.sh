@@ -43,6 +43,9 @@ packages_of() {
       echo 'libeigen3-dev          # peer of the matrix product'
       echo 'libceres-dev           # peer of the pose solver'
       echo 'libopencv-calib3d-dev  # peer of the tracking, solvePnP'
+      echo 'libopencv-imgproc-dev  # peer of the mask warp and blend'
+      echo 'libgtest-dev           # the scenes of the tests, which benchmarks share'
+      echo 'nlohmann-json3-dev     # benchmarks read landmark tracks'
       ;;
     *)
       echo "install_packages.sh: no group '$1' (build tools test check arm64 bench)" >&2
