@@ -108,6 +108,30 @@ BENCHMARK(MaskFrame)
     ->MeasureProcessCPUTime()
     ->UseRealTime();
 
+// The life of a frame's pool, a task for each face that does nothing.
+void Pool(benchmark::State& state) {
+  const auto face_count = static_cast<int32_t>(state.range(0));
+  for (auto _ : state) {
+    void* pool = mcvParallelInit(nullptr, static_cast<uint32_t>(face_count));
+    int32_t ids[N3DS_MAX_FACES];
+    for (int32_t i = 0; i < face_count; i++) {
+      ids[i] = mcvAddTask(
+          pool, [](void*) -> void* { return nullptr; }, nullptr);
+    }
+    for (int32_t i = 0; i < face_count; i++) {
+      if (mcvWaitTask(pool, ids[i]) != 0) state.SkipWithError("task failed");
+    }
+    if (mcvParallelUninit(pool) != 0) state.SkipWithError("no pool");
+  }
+}
+BENCHMARK(Pool)
+    ->Arg(1)
+    ->Arg(3)
+    ->Arg(5)
+    ->Unit(benchmark::kMicrosecond)
+    ->MeasureProcessCPUTime()
+    ->UseRealTime();
+
 void Matching(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));
   const auto frames = Frames(static_cast<int>(face_count));

@@ -1,5 +1,6 @@
 #!/bin/sh
-# Runs every benchmark program and writes one CSV of medians each.
+# Runs every benchmark program and writes one CSV of medians each; without program names also the
+# comparison of the tracking with solvePnP, a text.
 # usage: bench/run.sh [OUTPUT_DIRECTORY] [PROGRAM_NAME...]      default: build/bench/results, all
 set -eu
 root=$(cd "$(dirname "$0")/.." && pwd)
@@ -10,8 +11,15 @@ if [ ! -d "$programs" ]; then
   echo "no programs in $programs: cmake --preset bench && cmake --build --preset bench" >&2
   exit 1
 fi
-[ $# -gt 0 ] || set -- $(ls "$programs")
 mkdir -p "$out"
+peer=$root/build/bench/bench/solve_pnp_peer
+if [ $# -eq 0 ]; then
+  set -- $(ls "$programs")
+  if [ -x "$peer" ]; then
+    echo solve_pnp_peer >&2
+    "$peer" "$root"/examples/tracks/synthetic_*.track.jsonl >"$out/solve_pnp_peer.txt"
+  fi
+fi
 for name in "$@"; do
   echo "$name" >&2
   # Repetitions of different benchmarks take turns, so that a busy minute of the machine falls on
