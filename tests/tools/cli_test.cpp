@@ -13,6 +13,7 @@ using ::testing::AllOf;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Not;
 using ::testing::SizeIs;
 
 const std::string kModel = N3DS_SOURCE_DIR "/data/face_model.bin";
@@ -45,7 +46,7 @@ TEST_F(Cli, RefusesWrongUsage) {
   ExpectFailure({}, kUsage, "subcommand");
   ExpectFailure({"fly"}, kUsage, "");
   ExpectFailure({"track"}, kUsage, "track is required");
-  ExpectFailure({"track", "a", "--mode", "mask"}, kUsage, "--mode");
+  ExpectFailure({"track", "a", "--mode", "wings"}, kUsage, "--mode");
   ExpectFailure({"track", "a", "--wings"}, kUsage, "--wings");
   ExpectFailure({"render", "a"}, kUsage, "--out is required");
   ExpectFailure({"render", "a", "--out", "b", "--every", "0"}, kUsage, "--every");
@@ -63,6 +64,17 @@ TEST_F(Cli, TrackSummarisesEveryExample) {
                                    HasSubstr("reprojection")));
     EXPECT_THAT(outcome.err, IsEmpty());
   }
+}
+
+TEST_F(Cli, TrackJudgesTheMeshesOfMaskMode) {
+  const Outcome outcome = Run({"track", ExampleTrack("synthetic_talk_165"), "--mode", "mask",
+                               "--out", folder_.Path("r.jsonl")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  EXPECT_THAT(outcome.out, AllOf(HasSubstr("mesh          0 folded; landmarks' vertices off by"),
+                                 HasSubstr("mouth         opened to ")));
+  const std::string results = folder_.Read("r.jsonl");
+  EXPECT_THAT(results.substr(0, results.find('\n')), HasSubstr("\"mode\":\"mask\""));
+  EXPECT_THAT(Run({"track", ExampleTrack("photo_group_3")}).out, Not(HasSubstr("mesh")));
 }
 
 TEST_F(Cli, TrackWritesALineAFrame) {
@@ -170,6 +182,32 @@ TEST_F(Cli, EvalPrintsARowATrackAndOneOverAll) {
   }
   EXPECT_EQ(rows, 4);
   EXPECT_THAT(folder_.Names(), ElementsAre("scores.csv"));
+}
+
+TEST_F(Cli, EvalAddsColumnsForMeshes) {
+  const std::string csv = folder_.Path("scores.csv");
+  const Outcome outcome = Run({"eval", ExampleTrack("synthetic_talk_165"),
+                               ExampleTrack("synthetic_three"), "--mode", "mask", "--csv", csv});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  std::istringstream lines(folder_.Read("scores.csv"));
+  std::string line;
+  int rows = 0;
+  while (std::getline(lines, line)) {
+    ++rows;
+    EXPECT_EQ(std::count(line.begin(), line.end(), ','), 22) << line;
+    if (rows == 1) {
+      EXPECT_THAT(line, ::testing::EndsWith("mesh,p95,broken,folded,mouth"));
+      continue;
+    }
+    std::vector<std::string> cells;
+    std::istringstream words(line);
+    for (std::string cell; std::getline(words, cell, ',');) cells.push_back(cell);
+    EXPECT_LT(std::stod(cells[18]), 4) << line;  // median, percent
+    EXPECT_EQ(cells[20], "0");
+    EXPECT_EQ(cells[21], "0");
+    EXPECT_GT(std::stod(cells[22]), 0.5) << line;  // the mouth opens with the landmarks'
+  }
+  EXPECT_EQ(rows, 4);
 }
 
 TEST_F(Cli, EvalNeedsTruth) {

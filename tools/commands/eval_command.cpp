@@ -5,12 +5,15 @@
 #include <cstdio>
 #include <iostream>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
 #include "commands/commands.h"
 #include "commands/options.h"
 #include "engine/engine_session.h"
+#include "engine/face_model_file.h"
+#include "eval/mesh_metrics.h"
 #include "eval/metrics.h"
 #include "eval/score_table.h"
 #include "support/atomic_file.h"
@@ -38,12 +41,22 @@ void RunEvalCommand(const EvalOptions& options) {
   }
 
   std::vector<TrackPoses> poses;
+  std::vector<MeshScore> meshes;
+  std::optional<MeshJudge> judge;
+  if (options.engine.mode() == TrackMode::kMask) {
+    judge.emplace(ReadFaceModelFile(options.engine.model));
+    meshes.resize(tracks.size());
+  }
   {
     Progress progress("tracking", frames);
-    for (const Track& track : tracks) {
-      poses.push_back(CameraPoses(
-          track,
-          RunTrack(track, options.engine.model, options.engine.mode(), [&] { progress.Step(); })));
+    for (std::size_t k = 0; k < tracks.size(); ++k) {
+      const Track& track = tracks[k];
+      const auto use = [&](std::size_t f, const FrameResult& result) {
+        if (judge) judge->AddFrame(track.header, track.frames[f], result, meshes[k]);
+        progress.Step();
+      };
+      poses.push_back(
+          CameraPoses(track, RunTrack(track, options.engine.model, options.engine.mode(), use)));
     }
   }
   std::vector<JudgedTrack> judged;
@@ -56,7 +69,7 @@ void RunEvalCommand(const EvalOptions& options) {
     scores.emplace_back(one.track->name, ScoreTrack(one, offset));
   }
 
-  const TextTable table = ScoreTable(scores);
+  const TextTable table = ScoreTable(scores, meshes);
   if (!options.csv.empty()) {
     AtomicFile out(options.csv);
     table.PrintCsv(out.stream());
@@ -81,12 +94,14 @@ void AddEvalCommand(CLI::App& app) {
   command->add_option("--csv", options->csv, "The table as CSV")->type_name("FILE");
   AddEngineOptions(*command, options->engine);
   command->footer(
-      std::string("Columns:\n") + kScoreTableLegend +
+      std::string("Columns:\n") + kScoreTableLegend + "With --mode mask also:\n" +
+      kMeshColumnsLegend +
       "\nThe last line gives the constant offset between the truth's head frame and the\n"
       "engine's that was taken off, estimated over all tracks together.\n"
       "Examples:\n"
       "  n3ds eval examples/tracks/synthetic_yaw_sweep.track.jsonl\n"
-      "  n3ds eval *.track.jsonl --csv scores.csv");
+      "  n3ds eval *.track.jsonl --csv scores.csv\n"
+      "  n3ds eval examples/tracks/synthetic_talk_165.track.jsonl --mode mask");
   command->callback([options] { RunEvalCommand(*options); });
 }
 

@@ -8,7 +8,8 @@ namespace n3ds::tool {
 namespace {
 
 const std::map<std::string, TrackMode>& ModesByName() {
-  static const std::map<std::string, TrackMode> modes = {{"rigid", TrackMode::kRigid}};
+  static const std::map<std::string, TrackMode> modes = {{"rigid", TrackMode::kRigid},
+                                                         {"mask", TrackMode::kMask}};
   return modes;
 }
 
@@ -21,7 +22,9 @@ void AddEngineOptions(CLI::App& command, EngineOptions& options) {
       ->type_name("FILE")
       ->capture_default_str();
   command
-      .add_option("--mode", options.mode_name, "What the engine fits: rigid (the pose of the head)")
+      .add_option("--mode", options.mode_name,
+                  "What the engine fits: rigid (the pose of the head) or mask (its shape\n"
+                  "as well, as a dense mesh)")
       ->check(CLI::IsMember(ModesByName()))
       ->type_name("MODE")
       ->capture_default_str();

@@ -2,6 +2,7 @@
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
+#include <algorithm>
 #include <cmath>
 #include <cstdio>
 #include <memory>
@@ -12,7 +13,9 @@
 #include "commands/commands.h"
 #include "commands/options.h"
 #include "engine/engine_session.h"
+#include "engine/face_model_file.h"
 #include "engine/results_file.h"
+#include "eval/mesh_metrics.h"
 #include "support/atomic_file.h"
 #include "support/progress.h"
 #include "support/statistics.h"
@@ -43,6 +46,17 @@ void AddReprojection(const TrackHeader& header, const TrackFace& face, const Fac
   }
 }
 
+void PrintMeshScore(const MeshScore& score) {
+  std::printf("mesh          %zu folded; landmarks' vertices off by median %.2f %%, p95 %.2f %%\n",
+              score.folded, Percentile(score.distances, 0.50), Percentile(score.distances, 0.95));
+  const auto& seen = score.mouth_seen;
+  if (seen.empty()) return;
+  const auto widest = std::max_element(seen.begin(), seen.end()) - seen.begin();
+  std::printf("mouth         opened to %.1f %% in the landmarks, there %.1f %% in the mesh\n",
+              seen[static_cast<std::size_t>(widest)],
+              score.mouth_of_mesh[static_cast<std::size_t>(widest)]);
+}
+
 void RunTrackCommand(const TrackOptions& options) {
   const Track track = ReadTrackFile(options.track);
   EngineSession session(options.engine.model, track.header, options.engine.mode());
@@ -52,6 +66,11 @@ void RunTrackCommand(const TrackOptions& options) {
     WriteResultsHeader(out->stream(), track.header, options.engine.mode_name);
   }
 
+  std::optional<MeshJudge> judge;
+  if (options.engine.mode() == TrackMode::kMask) {
+    judge.emplace(ReadFaceModelFile(options.engine.model));
+  }
+  MeshScore meshes;
   std::size_t failed_frames = 0;
   std::size_t broken_faces = 0;
   std::vector<double> milliseconds;
@@ -69,6 +88,7 @@ void RunTrackCommand(const TrackOptions& options) {
           ++broken_faces;
         }
       }
+      if (judge) judge->AddFrame(track.header, frame, result, meshes);
       if (out) WriteResultsFrame(out->stream(), result);
       progress.Step();
     }
@@ -83,6 +103,7 @@ void RunTrackCommand(const TrackOptions& options) {
               Percentile(milliseconds, 0.99));
   std::printf("reprojection  rms %.3f px, median %.3f px, largest %.3f px\n",
               RootMeanSquare(distances), Percentile(distances, 0.50), Percentile(distances, 1.0));
+  if (judge) PrintMeshScore(meshes);
   if (out) std::printf("results       %s\n", options.out.c_str());
   if (failed_frames + broken_faces > 0) {
     throw Error(options.track + ": the engine failed on " +
@@ -106,9 +127,13 @@ void AddTrackCommand(CLI::App& app) {
   command->footer(
       "The summary counts frames and faces, gives the time of the engine's call over the frames\n"
       "with faces and the distance between the landmarks handed in and the 3-D landmarks as the\n"
-      "matrices draw them. The exit code is 1 when a frame failed.\n"
+      "matrices draw them. In mask mode it counts folded meshes and gives the distance between\n"
+      "the inner landmarks and their vertices of the mesh, and the opening of the inner lips, in\n"
+      "percent of the distance between the pupils over the heads turned by at most 40 degrees.\n"
+      "The exit code is 1 when a frame failed or a result is not finite.\n"
       "Examples:\n"
       "  n3ds track examples/tracks/synthetic_talk_165.track.jsonl\n"
+      "  n3ds track examples/tracks/synthetic_talk_165.track.jsonl --mode mask\n"
       "  n3ds track talk.track.jsonl --out talk.results.jsonl --model my_model.bin");
   command->callback([options] { RunTrackCommand(*options); });
 }

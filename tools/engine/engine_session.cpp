@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <memory>
 
+#include "engine/mesh_tables.h"
 #include "norvale_3d_sticker_engine.h"
 #include "support/error.h"
 
@@ -61,6 +62,7 @@ FrameResult EngineSession::Process(const TrackFrame& frame) {
   result.number = frame.number;
   result.faces.resize(frame.faces.size());
   Norvale_3DSticker_Matrix_Array out{};
+  Norvale_3DSticker_ModelInfo_Array meshes{};
   for (std::size_t i = 0; i < result.faces.size(); ++i) {
     result.faces[i].id = frame.faces[i].id;
     result.faces[i].landmarks3d.resize(3 * landmarks);
@@ -79,10 +81,16 @@ FrameResult EngineSession::Process(const TrackFrame& frame) {
           engine_, &image, static_cast<std::uint32_t>(frame.faces.size()),
           static_cast<std::uint32_t>(landmarks), points.data(), nullptr, nullptr, &out);
       break;
+    case TrackMode::kMask:
+      status = Norvale_3DSticker_Process_FaceMask(
+          engine_, &image, static_cast<std::uint32_t>(frame.faces.size()),
+          static_cast<std::uint32_t>(landmarks), points.data(), nullptr, nullptr, &out, &meshes);
+      break;
   }
   const std::chrono::duration<double, std::milli> taken = std::chrono::steady_clock::now() - start;
   result.milliseconds = taken.count();
-  result.ok = status == N3DS_OK && out.faceNum == frame.faces.size();
+  result.ok = status == N3DS_OK && out.faceNum == frame.faces.size() &&
+              (mode_ != TrackMode::kMask || meshes.modelNum == frame.faces.size());
   if (!result.ok) {
     result.faces.clear();
     return result;
@@ -94,18 +102,26 @@ FrameResult EngineSession::Process(const TrackFrame& frame) {
       result.faces[i].view[k] = matrices.viewMatrix[k];
       result.faces[i].model[k] = matrices.modelMatrix[k];
     }
+    if (mode_ == TrackMode::kMask) {
+      const Norvale_3DSticker_Face_Model& mesh = meshes.models[i];
+      result.faces[i].pitched = true;
+      result.faces[i].corners.assign(mesh.vertices, mesh.vertices + 3 * kMeshCorners);
+      // The same table for every face and frame.
+      texture_coordinates_.assign(mesh.texCoords, mesh.texCoords + 2 * kMeshCorners);
+    }
   }
   return result;
 }
 
 std::vector<FrameResult> RunTrack(const Track& track, const std::string& model_path, TrackMode mode,
-                                  const std::function<void()>& step) {
+                                  const std::function<void(std::size_t, const FrameResult&)>& use) {
   EngineSession session(model_path, track.header, mode);
   std::vector<FrameResult> results;
   results.reserve(track.frames.size());
-  for (const TrackFrame& frame : track.frames) {
-    results.push_back(session.Process(frame));
-    if (step) step();
+  for (std::size_t f = 0; f < track.frames.size(); ++f) {
+    results.push_back(session.Process(track.frames[f]));
+    if (use) use(f, results.back());
+    for (FaceResult& face : results.back().faces) std::vector<float>().swap(face.corners);
   }
   return results;
 }

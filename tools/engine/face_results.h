@@ -18,7 +18,9 @@ struct FaceResult {
   Matrix4 projection{};
   Matrix4 view{};
   Matrix4 model{};
+  bool pitched = false;            // the model frame is that of the model file, as in mask mode
   std::vector<float> landmarks3d;  // x, y, z per landmark in the model frame, mm
+  std::vector<float> corners;      // mask mode: x, y, z per corner of the mesh's triangles
 };
 
 struct FrameResult {
@@ -28,15 +30,27 @@ struct FrameResult {
   std::vector<FaceResult> faces;  // in the order of the track's frame
 };
 
+// The model matrix from the upright head frame, in either mode: mask mode's own is for the frame of
+// the model file, which is pitched by 20 degrees.
+Matrix4 HeadModel(const FaceResult& face);
+
 // Model frame to OpenGL eye space: view * model, in double.
 std::array<double, 16> ModelView(const FaceResult& face);
+// Upright head frame to OpenGL eye space.
+std::array<double, 16> HeadView(const FaceResult& face);
 
-// Every number of the matrices and landmarks is finite.
+// Every number of the matrices, landmarks and mesh is finite.
 bool IsFinite(const FaceResult& face);
+bool IsFinite(const std::vector<float>& values);
 
 // The engine's matrices are made for a viewport of even size; an odd last row or column of the
 // picture lies outside of it.
 inline int ViewportSize(int picture_size) { return picture_size - picture_size % 2; }
+
+// Where the matrices put a point of the model frame in the upright picture, which reaches from 0 to
+// its width and height. The engine's fits take the landmarks' numbers for such places.
+PixelPoint ProjectToPicture(const FaceResult& face, const TrackHeader& header, double x, double y,
+                            double z);
 
 // Where a renderer that uses nothing but the three matrices puts a point of the model frame, in
 // pixels of the upright picture as the landmarks count them: landmark x stands for the centre of

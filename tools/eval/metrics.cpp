@@ -71,11 +71,6 @@ OriginError CompareOrigin(const Vector3& estimated, const Vector3& truth) {
           100 * (estimated[2] / truth[2] - 1)};
 }
 
-double AbsoluteYaw(const Matrix3& rotation) {
-  // The third column is the direction in which the face looks; -z is towards the camera.
-  return std::abs(std::atan2(rotation[2], -rotation[8])) * kDegreesPerRadian;
-}
-
 void CountSwaps(const JudgedTrack& judged, const HeadFrameOffset& offset, double focal_ratio,
                 Score& score) {
   const std::vector<TrackFrame>& frames = judged.track->frames;
@@ -204,7 +199,7 @@ std::vector<double> Score::RotationErrors(double yaw) const {
 PoseEstimate CameraPose(const FaceResult& face) {
   PoseEstimate pose;
   if (!IsFinite(face)) return pose;
-  const auto model_view = ModelView(face);
+  const auto model_view = HeadView(face);
   // OpenGL looks along -z with y up, the camera frame along +z with y down.
   constexpr double kSigns[3] = {1, -1, -1};
   for (std::size_t row = 0; row < 3; ++row) {
@@ -226,6 +221,11 @@ TrackPoses CameraPoses(const Track& track, const std::vector<FrameResult>& resul
     }
   }
   return poses;
+}
+
+double AbsoluteYaw(const Matrix3& rotation) {
+  // The third column is the direction in which the face looks; -z is towards the camera.
+  return std::abs(std::atan2(rotation[2], -rotation[8])) * kDegreesPerRadian;
 }
 
 double EngineFocal(const TrackHeader& header) {

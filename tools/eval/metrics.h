@@ -82,6 +82,8 @@ struct Score {
 PoseEstimate CameraPose(const FaceResult& face);
 // All poses of a run; a failed frame gives invalid ones.
 TrackPoses CameraPoses(const Track& track, const std::vector<FrameResult>& results);
+// How far a head is turned to the side, in degrees without sign.
+double AbsoluteYaw(const Matrix3& rotation);
 // The focal length that the engine assumes for a picture.
 double EngineFocal(const TrackHeader& header);
 

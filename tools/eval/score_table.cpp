@@ -43,6 +43,16 @@ std::vector<std::string> Row(const std::string& name, const Score& score) {
   return row;
 }
 
+std::vector<std::string> MeshCells(const MeshScore& mesh) {
+  return {Cell(mesh.distances, 0.5, 2), Cell(mesh.distances, 0.95, 2),
+          std::to_string(mesh.not_finite), std::to_string(mesh.folded),
+          mesh.mouth_seen.empty() ? "-" : Decimal(mesh.MouthGain(), 2)};
+}
+
+void Append(const std::vector<std::string>& cells, std::vector<std::string>& row) {
+  row.insert(row.end(), cells.begin(), cells.end());
+}
+
 }  // namespace
 
 const char kScoreTableLegend[] =
@@ -59,15 +69,38 @@ const char kScoreTableLegend[] =
     "           the head turns by less than 15 degrees and moves by less than 60 mm a second\n"
     "lag        by which the rotation trails the true one, ms\n";
 
-TextTable ScoreTable(const NamedScores& scores) {
-  TextTable table({"track", "faces", "lost", "swaps", "jumps", "rot20", "p95", "rot40", "p95",
-                   "rot60", "p95", "across", "p95", "depth", "p95", "jit deg", "jit mm", "lag"});
+const char kMeshColumnsLegend[] =
+    "mesh       distance of the inner landmarks to their vertices of the dense mesh in the\n"
+    "           picture, percent of the distance between the pupils, median and 95th percentile\n"
+    "           over the heads turned by at most 40 degrees\n"
+    "broken     faces with a mesh that is not finite\n"
+    "folded     faces with a triangle turned over, by more than 150 degrees against a neighbour "
+    "or\n"
+    "           the mean face\n"
+    "mouth      how far the mesh's mouth opens where the landmarks' opens by one\n";
+
+TextTable ScoreTable(const NamedScores& scores, const std::vector<MeshScore>& meshes) {
+  std::vector<std::string> head = {"track", "faces", "lost", "swaps",   "jumps",  "rot20",
+                                   "p95",   "rot40", "p95",  "rot60",   "p95",    "across",
+                                   "p95",   "depth", "p95",  "jit deg", "jit mm", "lag"};
+  if (!meshes.empty()) Append({"mesh", "p95", "broken", "folded", "mouth"}, head);
+  TextTable table(head);
   Score all;
-  for (const auto& [name, score] : scores) {
-    table.AddRow(Row(name, score));
-    all.Add(score);
+  MeshScore all_meshes;
+  for (std::size_t k = 0; k < scores.size(); ++k) {
+    std::vector<std::string> row = Row(scores[k].first, scores[k].second);
+    all.Add(scores[k].second);
+    if (!meshes.empty()) {
+      Append(MeshCells(meshes[k]), row);
+      all_meshes.Add(meshes[k]);
+    }
+    table.AddRow(row);
   }
-  if (scores.size() > 1) table.AddRow(Row("all", all));
+  if (scores.size() > 1) {
+    std::vector<std::string> row = Row("all", all);
+    if (!meshes.empty()) Append(MeshCells(all_meshes), row);
+    table.AddRow(row);
+  }
   return table;
 }
 

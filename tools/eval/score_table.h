@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "eval/mesh_metrics.h"
 #include "eval/metrics.h"
 #include "eval/text_table.h"
 
@@ -12,9 +13,11 @@ namespace n3ds::tool {
 
 using NamedScores = std::vector<std::pair<std::string, Score>>;
 
-TextTable ScoreTable(const NamedScores& scores);
+// `meshes` is empty, or holds a score a track in the same order; then columns for them follow.
+TextTable ScoreTable(const NamedScores& scores, const std::vector<MeshScore>& meshes = {});
 
 // What the columns mean, for help texts and below printed tables.
 extern const char kScoreTableLegend[];
+extern const char kMeshColumnsLegend[];
 
 }  // namespace n3ds::tool

@@ -2,14 +2,12 @@
 
 #include <cmath>
 
+#include "engine/mesh_tables.h"
+
 namespace n3ds::tool {
 namespace {
 
 constexpr float kPi = 3.14159265358979F;
-
-constexpr std::uint16_t kTriangles[][3] = {
-#include "triangles.inc"
-};
 
 constexpr Material kSkin = {{0.80F, 0.74F, 0.69F}, 1, 0.08F};
 
@@ -90,7 +88,7 @@ Mesh FaceMesh(const std::vector<Point3>& points) {
     mesh.vertices.push_back(
         {{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2])}, {}});
   }
-  for (const auto& triangle : kTriangles) {
+  for (const auto& triangle : MeshTriangles()) {
     mesh.indices.insert(mesh.indices.end(), {triangle[0], triangle[1], triangle[2]});
   }
   ComputeNormals(mesh);

@@ -1,0 +1,59 @@
+// How well the dense meshes of mask mode fit the landmarks, and whether they are sound.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+#include "engine/face_model_file.h"
+#include "engine/face_results.h"
+#include "eval/metrics.h"
+#include "tracks/track_file.h"
+
+namespace n3ds::tool {
+
+// Faces turned further than this are left out of the distances: landmarks of the far side are then
+// a detector's guess.
+constexpr double kMeshYaw = 40;  // degrees, without sign
+
+// Two normals further apart than this are a fold, of a triangle against its neighbour or against
+// its place in the mean face.
+constexpr double kFoldDegrees = 150;
+
+// Lengths are in percent of the distance between the pupils in the same picture.
+struct MeshScore {
+  std::size_t faces = 0;           // with a finite pose and mesh, at any yaw
+  std::size_t not_finite = 0;      // faces with a number that is none
+  std::size_t folded = 0;          // faces with a fold
+  std::vector<double> distances;   // landmark to its vertex, inner landmarks, yaw within kMeshYaw
+  std::vector<double> mouth_seen;  // between the middles of the inner lips, in the landmarks
+  std::vector<double> mouth_of_mesh;  // the same in the mesh, face by face
+
+  void Add(const MeshScore& other);
+  // How far the mesh's mouth opens where the landmarks' opens by one: the slope of the regression
+  // of the one on the other, 0 without movement.
+  double MouthGain() const;
+};
+
+// Judges the meshes of one model frame by frame.
+class MeshJudge {
+ public:
+  explicit MeshJudge(const FaceModelFile& model);
+
+  // `result` is of mask mode and belongs to `frame`. The yaw is the truth's where there is one,
+  // else the engine's.
+  void AddFrame(const TrackHeader& header, const TrackFrame& frame, const FrameResult& result,
+                MeshScore& score) const;
+
+  // A triangle of the mesh (x, y, z per vertex) is turned over.
+  bool IsFolded(const std::vector<float>& vertices) const;
+
+ private:
+  void AddDistances(const TrackHeader& header, const TrackFace& face, const FaceResult& result,
+                    const std::vector<float>& vertices, MeshScore& score) const;
+
+  std::vector<Vector3> mean_normals_;                     // per triangle, in the model file's frame
+  std::vector<std::array<std::uint16_t, 2>> neighbours_;  // triangles with a common edge
+};
+
+}  // namespace n3ds::tool
