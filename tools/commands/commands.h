@@ -9,6 +9,8 @@ namespace n3ds::tool {
 void AddTrackCommand(CLI::App& app);
 void AddEvalCommand(CLI::App& app);
 void AddRenderCommand(CLI::App& app);
+void AddMaskCommand(CLI::App& app);
+void AddMeshCommand(CLI::App& app);
 void AddModelCommand(CLI::App& app);
 
 }  // namespace n3ds::tool

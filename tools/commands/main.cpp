@@ -23,12 +23,17 @@ int Run(int argc, char** argv) {
       "  n3ds track examples/tracks/real_expressions.track.jsonl --out results.jsonl\n"
       "  n3ds eval examples/tracks/synthetic_*.track.jsonl\n"
       "  n3ds render examples/tracks/real_two_people.track.jsonl --out two.mp4\n"
+      "  n3ds mask group.jpg group.track.jsonl --texture examples/assets/mask_tiger.png \\\n"
+      "      --out tigers.png\n"
+      "  n3ds mesh examples/tracks/synthetic_talk_165.track.jsonl --out meshes\n"
       "  n3ds model info data/face_model.bin\n"
       "'n3ds COMMAND --help' says more. The track format is described in\n"
       "examples/tracks/README.md.");
   n3ds::tool::AddTrackCommand(app);
   n3ds::tool::AddEvalCommand(app);
   n3ds::tool::AddRenderCommand(app);
+  n3ds::tool::AddMaskCommand(app);
+  n3ds::tool::AddMeshCommand(app);
   n3ds::tool::AddModelCommand(app);
   try {
     app.parse(argc, argv);

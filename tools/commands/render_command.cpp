@@ -3,11 +3,8 @@
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
 #include <algorithm>
-#include <cerrno>
 #include <cmath>
 #include <cstdio>
-#include <cstring>
-#include <filesystem>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -17,6 +14,7 @@
 #include <vector>
 
 #include "commands/commands.h"
+#include "commands/frames.h"
 #include "commands/options.h"
 #include "engine/engine_session.h"
 #include "render/contact_sheet.h"
@@ -38,6 +36,7 @@ struct RenderOptions {
   std::string track;
   std::string out;
   std::string image;
+  std::string texture;
   std::string size;
   std::vector<std::string> draw;
   std::optional<std::int64_t> frame;
@@ -79,13 +78,19 @@ Size FitInto(const TrackHeader& header, const std::optional<Size>& box, int defa
           std::max(1, static_cast<int>(std::lround(h * scale)))};
 }
 
-SceneParts ParseParts(const RenderOptions& options) {
-  if (options.draw.empty()) {
-    SceneParts parts;
-    // On a plain ground one would see hats and glasses hang in the air.
-    parts.head = options.image.empty();
-    return parts;
+SceneParts DefaultParts(const RenderOptions& options) {
+  SceneParts parts;
+  // On a plain ground one would see hats, glasses and masks hang in the air.
+  parts.head = options.image.empty();
+  if (options.engine.mode() == TrackMode::kMask) {
+    parts.glasses = parts.hat = parts.axes = parts.landmarks = false;
+    parts.mesh = options.texture.empty();
   }
+  return parts;
+}
+
+SceneParts ParseParts(const RenderOptions& options) {
+  if (options.draw.empty()) return DefaultParts(options);
   const std::set<std::string> names(options.draw.begin(), options.draw.end());
   SceneParts parts;
   parts.glasses = names.count("glasses") > 0;
@@ -93,7 +98,16 @@ SceneParts ParseParts(const RenderOptions& options) {
   parts.axes = names.count("axes") > 0;
   parts.landmarks = names.count("landmarks") > 0;
   parts.head = names.count("head") > 0;
+  parts.mesh = names.count("mesh") > 0;
+  parts.wireframe = names.count("wireframe") > 0;
   return parts;
+}
+
+void CheckMode(const RenderOptions& options, const SceneParts& parts) {
+  if (options.engine.mode() == TrackMode::kMask) return;
+  if (parts.mesh || parts.wireframe || !options.texture.empty()) {
+    throw Error("--texture and the parts mesh and wireframe need the dense mesh of --mode mask");
+  }
 }
 
 std::optional<Picture> LoadBackground(const RenderOptions& options, const TrackHeader& header) {
@@ -121,10 +135,8 @@ void DrawFrames(const Track& track, const RenderOptions& options, Scene& scene,
   for (std::size_t f = 0; f < track.frames.size() && next < chosen.size(); ++f) {
     const FrameResult result = session.Process(track.frames[f]);
     if (f != chosen[next]) continue;
-    if (!result.ok) {
-      throw Error(options.track + ": the engine failed on frame " + std::to_string(result.number));
-    }
-    use(result, scene.Draw(result));
+    CheckFrame(options.track, result);
+    use(result, scene.Draw(result, session.texture_coordinates()));
     progress.Step();
     ++next;
   }
@@ -136,20 +148,8 @@ std::vector<std::size_t> EveryNth(const Track& track, std::size_t every) {
   return chosen;
 }
 
-// The frame asked for, or else the first with a face.
-std::size_t OneFrame(const Track& track, const RenderOptions& options) {
-  for (std::size_t f = 0; f < track.frames.size(); ++f) {
-    const TrackFrame& frame = track.frames[f];
-    if (options.frame ? frame.number == *options.frame : !frame.faces.empty()) return f;
-  }
-  if (options.frame) {
-    throw Error(options.track + ": there is no frame " + std::to_string(*options.frame));
-  }
-  return 0;
-}
-
 void RenderPicture(const Track& track, const RenderOptions& options, Scene& scene) {
-  DrawFrames(track, options, scene, {OneFrame(track, options)},
+  DrawFrames(track, options, scene, {ChosenFrame(track, options.track, options.frame)},
              [&](const FrameResult&, const Picture& picture) { WritePng(options.out, picture); });
 }
 
@@ -172,19 +172,16 @@ void RenderFilm(const Track& track, const RenderOptions& options, Scene& scene, 
 }
 
 void RenderFolder(const Track& track, const RenderOptions& options, Scene& scene) {
-  std::error_code error;
-  std::filesystem::create_directories(options.out, error);
-  if (error) throw Error(options.out + ": the folder cannot be made (" + error.message() + ")");
+  MakeFolder(options.out);
   DrawFrames(track, options, scene, EveryNth(track, options.every),
              [&](const FrameResult& result, const Picture& picture) {
-               char name[32];
-               std::snprintf(name, sizeof name, "/frame_%06lld.png",
-                             static_cast<long long>(result.number));
-               WritePng(options.out + name, picture);
+               WritePng(options.out + FrameName(result.number, ".png"), picture);
              });
 }
 
 void RunRenderCommand(const RenderOptions& options) {
+  const SceneParts parts = ParseParts(options);
+  CheckMode(options, parts);
   const Track track = ReadTrackFile(options.track);
   const bool png = EndsWith(options.out, ".png");
   const bool film = EndsWith(options.out, ".mp4");
@@ -200,8 +197,10 @@ void RunRenderCommand(const RenderOptions& options) {
     size.width = std::max(2, size.width / 2 * 2);
     size.height = std::max(2, size.height / 2 * 2);
   }
-  Scene scene(track.header, options.engine.model, ParseParts(options),
-              LoadBackground(options, track.header), size.width, size.height);
+  std::optional<Picture> mask;
+  if (!options.texture.empty()) mask = ReadPicture(options.texture);
+  Scene scene(track.header, options.engine.model, parts, LoadBackground(options, track.header),
+              size.width, size.height, mask);
   if (film) {
     RenderFilm(track, options, scene, size);
   } else if (sheet) {
@@ -219,7 +218,8 @@ void RunRenderCommand(const RenderOptions& options) {
 void AddRenderCommand(CLI::App& app) {
   CLI::App* command = app.add_subcommand(
       "render",
-      "Draws a hat and glasses on the faces of a track, placed by the engine's matrices alone.");
+      "Draws a hat and glasses on the faces of a track, placed by the engine's matrices alone; in\n"
+      "mask mode the face's dense mesh, plain or under a mask picture.");
   const auto options = std::make_shared<RenderOptions>();
   command->add_option("track", options->track, "Landmark track")
       ->required()
@@ -252,10 +252,16 @@ void AddRenderCommand(CLI::App& app) {
   command
       ->add_option("--draw", options->draw,
                    "What to draw: glasses, hat, axes, landmarks, head (all by default; the head\n"
-                   "not on a photo)")
+                   "not on a photo); in mask mode also mesh, wireframe (by default the mesh, and\n"
+                   "the head not on a photo)")
       ->delimiter(',')
       ->type_name("LIST")
-      ->check(CLI::IsMember({"glasses", "hat", "axes", "landmarks", "head"}));
+      ->check(CLI::IsMember({"glasses", "hat", "axes", "landmarks", "head", "mesh", "wireframe"}));
+  command
+      ->add_option("--texture", options->texture,
+                   "PNG or JPEG drawn on the dense mesh of mask mode, in the layout of\n"
+                   "data/face_template.png")
+      ->type_name("MASK.png");
   AddEngineOptions(*command, options->engine);
   command->footer(
       "The output shows the upright, unmirrored picture, whatever the orientation of the track.\n"
@@ -265,7 +271,9 @@ void AddRenderCommand(CLI::App& app) {
       "  n3ds render talk.track.jsonl --out talk.png --contact-sheet 12\n"
       "  n3ds render talk.track.jsonl --out talk.mp4 --size 640x640\n"
       "  n3ds render group.track.jsonl --image group.jpg --out group.png\n"
-      "  n3ds render talk.track.jsonl --out frames --every 10 --draw glasses,head");
+      "  n3ds render talk.track.jsonl --out frames --every 10 --draw glasses,head\n"
+      "  n3ds render talk.track.jsonl --out mesh.png --mode mask --draw mesh,wireframe\n"
+      "  n3ds render talk.track.jsonl --out tiger.mp4 --mode mask --texture tiger.png");
   command->callback([options] { RunRenderCommand(*options); });
 }
 

@@ -1,17 +1,12 @@
 #include "render/gpu_mesh.h"
 
-#include <cstddef>
 #include <cstdint>
 
 namespace n3ds::tool {
-namespace {
 
-// OpenGL takes a place in the bound buffer as a pointer.
 const void* BufferOffset(std::size_t bytes) {
   return reinterpret_cast<const void*>(bytes);  // NOLINT(performance-no-int-to-ptr)
 }
-
-}  // namespace
 
 GpuMesh::GpuMesh(const Mesh& mesh) : parts_(mesh.parts) {
   glGenVertexArrays(1, &array_);

@@ -3,11 +3,15 @@
 
 #include <GLES3/gl3.h>
 
+#include <cstddef>
 #include <vector>
 
 #include "render/mesh.h"
 
 namespace n3ds::tool {
+
+// OpenGL takes a place in the bound buffer as a pointer.
+const void* BufferOffset(std::size_t bytes);
 
 class GpuMesh {
  public:

@@ -84,13 +84,70 @@ void main() {
                        : vec4(vec3(0.92, 0.97, 1.04) * shade, 1.0);
 })";
 
+// The mask picture on the dense mesh. Its colours are multiplied by their alpha beforehand, so that
+// what hides in transparent places does not bleed over the edges.
+const char kMaskVertex[] = R"(
+layout(location = 0) in vec3 position;
+layout(location = 1) in vec3 normal;
+layout(location = 2) in vec2 texture_coordinate;
+uniform mat4 projection;
+uniform mat4 view;
+uniform mat4 model;
+out vec3 eye_normal;
+out vec2 place;
+void main() {
+  eye_normal = mat3(view) * mat3(model) * normal;
+  place = texture_coordinate;
+  gl_Position = projection * (view * model * vec4(position, 1.0));
+})";
+
+const char kMaskFragment[] = R"(
+in vec3 eye_normal;
+in vec2 place;
+uniform sampler2D picture;
+out vec4 result;
+void main() {
+  vec3 n = normalize(eye_normal);
+  float direct = max(dot(n, normalize(vec3(-0.45, 0.75, 0.70))), 0.0);
+  vec4 colour = texture(picture, place);
+  result = vec4(min(colour.rgb * (0.68 + 0.42 * direct), vec3(colour.a)), colour.a);
+})";
+
+// Every triangle's own edges, by the distance to them; an edge that two triangles share is drawn
+// half by each.
+const char kWireVertex[] = R"(
+layout(location = 0) in vec3 position;
+uniform mat4 projection;
+uniform mat4 view;
+uniform mat4 model;
+out vec3 weights;
+void main() {
+  int corner = gl_VertexID % 3;
+  weights = vec3(corner == 0, corner == 1, corner == 2);
+  gl_Position = projection * (view * model * vec4(position, 1.0));
+})";
+
+const char kWireFragment[] = R"(
+in vec3 weights;
+uniform vec3 colour;
+uniform float half_width;
+out vec4 result;
+void main() {
+  vec3 distances = weights / fwidth(weights);
+  float nearest = min(distances.x, min(distances.y, distances.z));
+  float opacity = clamp(half_width + 0.5 - nearest, 0.0, 1.0);
+  result = 0.85 * opacity * vec4(colour, 1.0);
+})";
+
+const Material kPlaster = {{0.80F, 0.74F, 0.69F}, 1, 0.08F};
+
 std::string Asset(const char* name) { return std::string(N3DS_ASSET_DIR "/") + name; }
 
-void SetMatrices(const GlProgram& program, const FaceResult& face) {
+void SetMatrices(const GlProgram& program, const FaceResult& face, const Matrix4& model) {
   program.Use();
   glUniformMatrix4fv(program.Uniform("projection"), 1, GL_FALSE, face.projection.data());
   glUniformMatrix4fv(program.Uniform("view"), 1, GL_FALSE, face.view.data());
-  glUniformMatrix4fv(program.Uniform("model"), 1, GL_FALSE, face.model.data());
+  glUniformMatrix4fv(program.Uniform("model"), 1, GL_FALSE, model.data());
 }
 
 GLuint UploadTexture(const Picture& picture) {
@@ -108,33 +165,49 @@ GLuint UploadTexture(const Picture& picture) {
   return texture;
 }
 
+Picture Premultiplied(Picture picture) {
+  for (std::size_t i = 0; i < picture.rgba.size(); i += 4) {
+    for (std::size_t k = 0; k < 3; ++k) {
+      picture.rgba[i + k] =
+          static_cast<std::uint8_t>((picture.rgba[i + k] * picture.rgba[i + 3] + 127) / 255);
+    }
+  }
+  return picture;
+}
+
 }  // namespace
 
 Scene::Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
-             const std::optional<Picture>& background, int width, int height)
+             const std::optional<Picture>& background, int width, int height,
+             const std::optional<Picture>& mask)
     : header_(header),
       parts_(parts),
       target_(width, height),
       solid_(kSolidVertex, kSolidFragment),
       dots_(kDotVertex, kDotFragment),
       ground_(kGroundVertex, kGroundFragment),
+      mask_(kMaskVertex, kMaskFragment),
+      wire_(kWireVertex, kWireFragment),
       face_(FaceMesh(ReadFaceModelFile(model_path))),
       skull_(SkullMesh()),
+      open_skull_(OpenSkullMesh()),
       glasses_(ReadObj(Asset("glasses.obj"))),
       hat_(ReadObj(Asset("hat.obj"))),
       tripod_(TripodMesh()) {
   glGenVertexArrays(1, &dot_array_);
   glGenBuffers(1, &dot_buffer_);
   if (background) background_ = UploadTexture(*background);
+  if (mask) mask_picture_ = UploadTexture(Premultiplied(*mask));
 }
 
 Scene::~Scene() {
+  glDeleteTextures(1, &mask_picture_);
   glDeleteTextures(1, &background_);
   glDeleteBuffers(1, &dot_buffer_);
   glDeleteVertexArrays(1, &dot_array_);
 }
 
-Picture Scene::Draw(const FrameResult& frame) {
+Picture Scene::Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates) {
   target_.Bind();
   glViewport(0, 0, target_.width(), target_.height());
   glClear(GL_DEPTH_BUFFER_BIT);
@@ -150,15 +223,24 @@ Picture Scene::Draw(const FrameResult& frame) {
 
   std::vector<const FaceResult*> faces;
   for (const FaceResult& face : frame.faces) {
-    if (IsFinite(face)) faces.push_back(&face);
+    if (!IsFinite(face)) continue;
+    if (!face.corners.empty()) meshes_[faces.size()].Update(face.corners, texture_coordinates);
+    faces.push_back(&face);
   }
   glEnable(GL_DEPTH_TEST);
-  for (const FaceResult* face : faces) DrawHead(*face);
+  glDepthFunc(GL_LEQUAL);
+  for (std::size_t i = 0; i < faces.size(); ++i) DrawHead(*faces[i], meshes_[i]);
   for (const FaceResult* face : faces) DrawStickers(*face, true);
-  // Lenses let what is behind them shine through, so they come last and hide nothing.
+  // What lets the ground shine through comes last and hides nothing: masks, then lenses.
   glEnable(GL_BLEND);
-  glBlendFuncSeparate(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA, GL_ZERO, GL_ONE);
+  glBlendFuncSeparate(GL_ONE, GL_ONE_MINUS_SRC_ALPHA, GL_ZERO, GL_ONE);
   glDepthMask(GL_FALSE);
+  for (std::size_t i = 0; i < faces.size(); ++i) {
+    if (faces[i]->corners.empty()) continue;
+    if (mask_picture_ != 0) DrawMask(*faces[i], meshes_[i]);
+    if (parts_.wireframe) DrawWireframe(*faces[i], meshes_[i]);
+  }
+  glBlendFuncSeparate(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA, GL_ZERO, GL_ONE);
   for (const FaceResult* face : faces) DrawStickers(*face, false);
   glDisable(GL_DEPTH_TEST);
   if (parts_.landmarks) {
@@ -178,12 +260,58 @@ void Scene::DrawBackground() const {
   glDrawArrays(GL_TRIANGLES, 0, 3);
 }
 
-void Scene::DrawHead(const FaceResult& face) const {
-  const GLboolean seen = parts_.head ? GL_TRUE : GL_FALSE;
-  glColorMask(seen, seen, seen, GL_FALSE);
-  DrawMesh(face_, face, true);
-  DrawMesh(skull_, face, true);
+void Scene::DrawHead(const FaceResult& face, const MaskMesh& mesh) const {
+  const auto show = [](bool seen) {
+    const GLboolean mask = seen ? GL_TRUE : GL_FALSE;
+    glColorMask(mask, mask, mask, GL_FALSE);
+  };
+  // A hair's breadth back, so that what is drawn on the very same surface lies before it.
+  glEnable(GL_POLYGON_OFFSET_FILL);
+  glPolygonOffset(1, 1);
+  if (face.corners.empty()) {
+    show(parts_.head);
+    DrawMesh(face_, face, true);
+  } else {
+    show(parts_.head || parts_.mesh);
+    SetMatrices(solid_, face, face.model);
+    SetMaterial(kPlaster);
+    mesh.Draw();
+  }
+  show(parts_.head);
+  DrawMesh(face.corners.empty() ? skull_ : open_skull_, face, true);
+  glDisable(GL_POLYGON_OFFSET_FILL);
   glColorMask(GL_TRUE, GL_TRUE, GL_TRUE, GL_TRUE);
+}
+
+void Scene::DrawMask(const FaceResult& face, const MaskMesh& mesh) const {
+  SetMatrices(mask_, face, face.model);
+  glUniform1i(mask_.Uniform("picture"), 0);
+  glBindTexture(GL_TEXTURE_2D, mask_picture_);
+  // Paint on the skin has no inside.
+  glEnable(GL_CULL_FACE);
+  mesh.Draw();
+  glDisable(GL_CULL_FACE);
+}
+
+void Scene::DrawWireframe(const FaceResult& face, const MaskMesh& mesh) const {
+  const bool on_skin = parts_.head || parts_.mesh;
+  SetMatrices(wire_, face, face.model);
+  // Dark on the light mesh, light on everything else.
+  if (on_skin) {
+    glUniform3f(wire_.Uniform("colour"), 0.10F, 0.20F, 0.38F);
+  } else {
+    glUniform3f(wire_.Uniform("colour"), 0.75F, 0.95F, 1.0F);
+  }
+  glUniform1f(wire_.Uniform("half_width"), 0.3F);
+  glEnable(GL_CULL_FACE);
+  mesh.Draw();
+  glDisable(GL_CULL_FACE);
+}
+
+void Scene::SetMaterial(const Material& material) const {
+  glUniform3fv(solid_.Uniform("colour"), 1, material.colour.data());
+  glUniform1f(solid_.Uniform("opacity"), material.opacity);
+  glUniform1f(solid_.Uniform("gloss"), material.gloss);
 }
 
 void Scene::DrawStickers(const FaceResult& face, bool opaque) const {
@@ -193,18 +321,16 @@ void Scene::DrawStickers(const FaceResult& face, bool opaque) const {
 }
 
 void Scene::DrawMesh(const GpuMesh& mesh, const FaceResult& face, bool opaque) const {
-  SetMatrices(solid_, face);
+  SetMatrices(solid_, face, HeadModel(face));
   for (const MeshPart& part : mesh.parts()) {
     if ((part.material.opacity >= 1) != opaque) continue;
-    glUniform3fv(solid_.Uniform("colour"), 1, part.material.colour.data());
-    glUniform1f(solid_.Uniform("opacity"), part.material.opacity);
-    glUniform1f(solid_.Uniform("gloss"), part.material.gloss);
+    SetMaterial(part.material);
     mesh.DrawPart(part);
   }
 }
 
 void Scene::DrawLandmarks(const FaceResult& face) const {
-  SetMatrices(dots_, face);
+  SetMatrices(dots_, face, face.model);
   // In proportion to the face, so that lids and lips stay apart: 150 mm is a head's breadth.
   const double depth = -ModelView(face)[14];
   const double breadth = 150 / depth * face.projection[0] / 2 * target_.width();

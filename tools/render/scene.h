@@ -1,16 +1,20 @@
 // Draws what a user of stickers sees: a picture or a plain ground, and on every face a hat and a
-// pair of glasses, placed by nothing but the engine's three matrices.
+// pair of glasses, placed by nothing but the engine's three matrices, or its dense mesh, lit, as
+// wireframe or under a mask picture.
 //
 // Everything is drawn in the upright, unmirrored picture.
 #pragma once
 
+#include <array>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "engine/face_results.h"
 #include "render/egl_context.h"
 #include "render/gl_program.h"
 #include "render/gpu_mesh.h"
+#include "render/mask_mesh.h"
 #include "render/picture.h"
 #include "render/render_target.h"
 #include "tracks/track_file.h"
@@ -23,24 +27,32 @@ struct SceneParts {
   bool axes = true;
   bool landmarks = true;
   bool head = false;  // draw the head itself instead of only letting it hide what is behind it
+  bool mesh = false;  // draw the face's dense mesh alone; as all below, in mask mode only
+  bool wireframe = false;
 };
 
 class Scene {
  public:
-  // `background` is upright already; without one the ground is plain. Throws Error when the model
-  // or an asset cannot be read or the graphics system refuses.
+  // `background` is upright already; without one the ground is plain. `mask` is drawn on the dense
+  // meshes of mask mode. Throws Error when the model or an asset cannot be read or the graphics
+  // system refuses.
   Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
-        const std::optional<Picture>& background, int width, int height);
+        const std::optional<Picture>& background, int width, int height,
+        const std::optional<Picture>& mask = std::nullopt);
   ~Scene();
 
-  // The result stays valid on its own. Faces without a finite pose are left out.
-  Picture Draw(const FrameResult& frame);
+  // The result stays valid on its own. Faces without a finite pose are left out. Meshes need the
+  // engine's texture coordinates, u, v per corner.
+  Picture Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates = {});
 
  private:
   void DrawBackground() const;
-  void DrawHead(const FaceResult& face) const;
+  void DrawHead(const FaceResult& face, const MaskMesh& mesh) const;
+  void DrawMask(const FaceResult& face, const MaskMesh& mesh) const;
+  void DrawWireframe(const FaceResult& face, const MaskMesh& mesh) const;
   void DrawStickers(const FaceResult& face, bool opaque) const;
   void DrawMesh(const GpuMesh& mesh, const FaceResult& face, bool opaque) const;
+  void SetMaterial(const Material& material) const;
   void DrawLandmarks(const FaceResult& face) const;
 
   EglContext context_;
@@ -50,14 +62,19 @@ class Scene {
   GlProgram solid_;
   GlProgram dots_;
   GlProgram ground_;
+  GlProgram mask_;
+  GlProgram wire_;
   GpuMesh face_;
   GpuMesh skull_;
+  GpuMesh open_skull_;
   GpuMesh glasses_;
   GpuMesh hat_;
   GpuMesh tripod_;
   GLuint dot_array_ = 0;
   GLuint dot_buffer_ = 0;
-  GLuint background_ = 0;  // texture, 0 without
+  GLuint background_ = 0;    // texture, 0 without
+  GLuint mask_picture_ = 0;  // the same
+  std::array<MaskMesh, kMaxTrackFaces> meshes_;
 };
 
 }  // namespace n3ds::tool

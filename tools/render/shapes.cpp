@@ -108,6 +108,28 @@ Mesh SkullMesh() {
   return mesh;
 }
 
+Mesh OpenSkullMesh() {
+  constexpr float kForehead = 75;  // y, a little under the upper edge of the face
+  constexpr float kCheek = 30;     // z, a little before its sides
+  const Mesh whole = SkullMesh();
+  Mesh open;
+  open.vertices = whole.vertices;
+  for (const MeshPart& part : whole.parts) {
+    const std::size_t first = open.indices.size();
+    for (std::size_t i = part.first_index; i < part.first_index + part.index_count; i += 3) {
+      bool covered = true;
+      for (std::size_t k = 0; k < 3; ++k) {
+        const auto& p = whole.vertices[whole.indices[i + k]].position;
+        covered = covered && p[1] < kForehead && p[2] > kCheek;
+      }
+      if (covered) continue;
+      open.indices.insert(open.indices.end(), &whole.indices[i], &whole.indices[i] + 3);
+    }
+    open.parts.push_back({part.material, first, open.indices.size() - first});
+  }
+  return open;
+}
+
 Mesh TripodMesh() {
   constexpr std::array<float, 3> kStart = {0, -7, 124};
   Mesh mesh = Arrow(kStart, 0, {{0.85F, 0.15F, 0.12F}, 1, 0.3F});

@@ -19,6 +19,10 @@ Mesh FaceMesh(const FaceModelFile& model);
 // is seen.
 Mesh SkullMesh();
 
+// The same without what lies under the face: a dense mesh has open eyes and a mouth that opens, and
+// it is not the mean face's, so the skull would come through.
+Mesh OpenSkullMesh();
+
 // Three arrows along x (red), y (green) and z (blue) from before the tip of the nose.
 Mesh TripodMesh();
 

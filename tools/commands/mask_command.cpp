@@ -1,0 +1,122 @@
+// n3ds mask: a mask picture on the faces of a photo, through the library's own image functions.
+#include <CLI/App.hpp>
+#include <CLI/Config.hpp>
+#include <CLI/Formatter.hpp>
+#include <cstdint>
+#include <cstdio>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "commands/commands.h"
+#include "commands/frames.h"
+#include "engine/core_session.h"
+#include "engine/engine_session.h"
+#include "render/camera_picture.h"
+#include "render/picture.h"
+#include "support/error.h"
+#include "tracks/track_file.h"
+
+namespace n3ds::tool {
+namespace {
+
+using Convert = CameraPicture (*)(const Picture&);
+
+const std::map<std::string, Convert>& Formats() {
+  static const std::map<std::string, Convert> formats = {{"bgr24", CameraPicture::Bgr24},
+                                                         {"nv21", CameraPicture::Nv21}};
+  return formats;
+}
+
+struct MaskOptions {
+  std::string model = DefaultModelPath();
+  std::string photo;
+  std::string track;
+  std::string texture;
+  std::string out;
+  std::string format = "bgr24";
+  std::optional<std::int64_t> frame;
+};
+
+// The photo as the landmarks see it: their pixels are those of the track's picture.
+Picture LoadPhoto(const MaskOptions& options, const TrackHeader& header) {
+  const Picture photo = ReadPicture(options.photo);
+  if (photo.width != header.width || photo.height != header.height) {
+    throw Error(options.photo + ": the picture has " + std::to_string(photo.width) + " x " +
+                std::to_string(photo.height) + " pixels, the track " +
+                std::to_string(header.width) + " x " + std::to_string(header.height));
+  }
+  return Upright(photo, header.degree, header.mirror == 1);
+}
+
+void RunMaskCommand(const MaskOptions& options) {
+  const Track track = ReadTrackFile(options.track);
+  const std::size_t chosen = ChosenFrame(track, options.track, options.frame);
+  if (track.frames[chosen].faces.empty()) {
+    throw Error(options.track + ": frame " + std::to_string(track.frames[chosen].number) +
+                " has no face to put a mask on");
+  }
+  const Picture photo = LoadPhoto(options, track.header);
+  CameraPicture texture = CameraPicture::Bgra32(ReadPicture(options.texture));
+
+  CoreSession session(options.model, track.header);
+  for (std::size_t f = 0; f <= chosen; ++f) session.Process(track.frames[f]);
+  CameraPicture image = Formats().at(options.format)(photo);
+  for (const std::size_t face : session.FarToNear()) {
+    CameraPicture mask = CameraPicture::ClearBgra32(image.width(), image.height());
+    session.Warp(texture.Descriptor(), face, mask.Descriptor());
+    session.Blend(mask.Descriptor(), image.Descriptor());
+  }
+  WritePng(options.out, image.ToPicture(photo.width, photo.height));
+  std::printf("%s: %zu %s\n", options.out.c_str(), session.faces(),
+              session.faces() == 1 ? "face" : "faces");
+}
+
+}  // namespace
+
+void AddMaskCommand(CLI::App& app) {
+  CLI::App* command = app.add_subcommand(
+      "mask",
+      "Puts a mask picture on the faces of a photo with the library's own image functions, which\n"
+      "need no graphics system.");
+  const auto options = std::make_shared<MaskOptions>();
+  command->add_option("photo", options->photo, "PNG or JPEG as delivered, of the track's size")
+      ->required()
+      ->type_name("PHOTO");
+  command->add_option("track", options->track, "Landmark track of the photo")
+      ->required()
+      ->type_name("FILE.track.jsonl");
+  command
+      ->add_option("--texture", options->texture,
+                   "Mask picture, PNG or JPEG, in the layout of data/face_template.png")
+      ->required()
+      ->type_name("MASK.png");
+  command->add_option("--out", options->out, "The upright picture with the masks")
+      ->required()
+      ->type_name("FILE.png");
+  command
+      ->add_option("--format", options->format,
+                   "Pixel format in which the picture is blended: bgr24 (3 bytes a pixel) or nv21\n"
+                   "(a luma and a chroma plane)")
+      ->check(CLI::IsMember(Formats()))
+      ->type_name("FORMAT")
+      ->capture_default_str();
+  command
+      ->add_option("--frame", options->frame,
+                   "Number of the photo's frame, by default the first with a face; the frames\n"
+                   "before it are tracked too")
+      ->type_name("N");
+  command->add_option("--model", options->model, "Face-model file")
+      ->type_name("FILE")
+      ->capture_default_str();
+  command->footer(
+      "Examples:\n"
+      "  n3ds mask group.jpg group.track.jsonl --texture examples/assets/mask_tiger.png \\\n"
+      "      --out tigers.png\n"
+      "  n3ds mask group.jpg group.track.jsonl --texture examples/assets/mask_gold.png \\\n"
+      "      --format nv21 --out gold.png");
+  command->callback([options] { RunMaskCommand(*options); });
+}
+
+}  // namespace n3ds::tool
