@@ -1,13 +1,17 @@
 #include "engine/core_session.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdint>
 #include <fstream>
 #include <iterator>
 #include <numeric>
+#include <utility>
 
 #include "engine/face_model_file.h"
+#include "engine/face_results.h"
+#include "engine/mesh_tables.h"
 #include "support/error.h"
 #include "tracks/upright.h"
 
@@ -23,6 +27,62 @@ void Check(MRESULT result, const std::string& what) {
 std::vector<char> ReadBytes(const std::string& path) {
   std::ifstream in(path, std::ios::binary);
   return {std::istreambuf_iterator<char>(in), {}};
+}
+
+using Vector3 = std::array<double, 3>;
+using Triangle = std::array<std::uint16_t, 3>;
+
+// Vertices before the viewer: x right, y up, z towards it, mm.
+std::vector<Vector3> BeforeViewer(const N3DS_3D_MODEL& mesh, const N3DS_RIGID_MATRIX& matrices) {
+  FaceResult face;
+  std::copy_n(matrices.viewMatrix, 16, face.view.begin());
+  std::copy_n(matrices.modelMatrix, 16, face.model.begin());
+  const std::array<double, 16> m = ModelView(face);
+  std::vector<Vector3> seen(kModelVertices);
+  for (std::size_t v = 0; v < seen.size(); ++v) {
+    const float* p = mesh.vertices + 3 * v;
+    for (std::size_t row = 0; row < 3; ++row) {
+      seen[v][row] = m[row] * double{p[0]} + m[4 + row] * double{p[1]} + m[8 + row] * double{p[2]} +
+                     m[12 + row];
+    }
+  }
+  return seen;
+}
+
+// Positive for a triangle that turns its outside to the viewer: its corners run counter-clockwise
+// round the line of sight.
+double Facing(const Vector3& a, const Vector3& b, const Vector3& c) {
+  return -(a[0] * (b[1] * c[2] - b[2] * c[1]) + a[1] * (b[2] * c[0] - b[0] * c[2]) +
+           a[2] * (b[0] * c[1] - b[1] * c[0]));
+}
+
+// As many triangles as the mesh has, the farthest first; those that look away are shrunk to a
+// point, which draws nothing.
+std::vector<Triangle> VisibleTriangles(const std::vector<Vector3>& seen) {
+  std::vector<std::pair<double, Triangle>> by_depth;
+  by_depth.reserve(kMeshTriangles);
+  for (const Triangle& t : MeshTriangles()) {
+    const Vector3& a = seen[t[0]];
+    const Vector3& b = seen[t[1]];
+    const Vector3& c = seen[t[2]];
+    if (Facing(a, b, c) > 0) by_depth.emplace_back(a[2] + b[2] + c[2], t);
+  }
+  std::stable_sort(by_depth.begin(), by_depth.end(),
+                   [](const auto& left, const auto& right) { return left.first < right.first; });
+  std::vector<Triangle> triangles;
+  for (const auto& [depth, triangle] : by_depth) triangles.push_back(triangle);
+  triangles.resize(kMeshTriangles, Triangle{});
+  return triangles;
+}
+
+// The engine's layout as the warp takes a caller's own: v up.
+std::vector<float> UpwardCoordinates() {
+  std::vector<float> coordinates;
+  for (const auto& [u, v] : MeshTextureCoordinates()) {
+    coordinates.push_back(u);
+    coordinates.push_back(1 - v);
+  }
+  return coordinates;
 }
 
 }  // namespace
@@ -84,9 +144,18 @@ std::vector<std::size_t> CoreSession::FarToNear() const {
 }
 
 void CoreSession::Warp(const NSVL_OFFSCREEN& texture, std::size_t face, NSVL_OFFSCREEN output) {
+  const std::vector<Triangle> triangles =
+      VisibleTriangles(BeforeViewer(meshes_[face], matrices_[face]));
+  const std::vector<float> coordinates = UpwardCoordinates();
   N3DS_2D_TEXTURE_MASK mask{};
+  mask.texCoords = coordinates.data();
+  mask.texCoordCount = static_cast<std::int64_t>(kModelVertices);
+  mask.triangles = triangles[0].data();
+  mask.triangleCount = static_cast<std::int64_t>(kMeshTriangles);
   mask.image = texture;
-  Check(N3DS_WarpFaceMask(core_, &mask, &output, &meshes_[face], output.width, output.height,
+  N3DS_3D_MODEL mesh = meshes_[face];
+  mesh.triangles = mask.triangles;
+  Check(N3DS_WarpFaceMask(core_, &mask, &output, &mesh, output.width, output.height,
                           static_cast<int>(face)),
         "the mask cannot be drawn onto face " + std::to_string(face));
 }

@@ -27,7 +27,9 @@ class CoreSession {
   // Faces of the last frame, the farthest first.
   std::vector<std::size_t> FarToNear() const;
 
-  // N3DS_WarpFaceMask onto `output` and N3DS_BlendFaceMask onto `image`. Throw Error.
+  // N3DS_WarpFaceMask onto `output` and N3DS_BlendFaceMask onto `image`. Throw Error. The warp
+  // draws one triangle over the other in the order of its lists; they are handed in the farthest
+  // first and without those that look away, or the far cheek of a turned head would show through.
   void Warp(const NSVL_OFFSCREEN& texture, std::size_t face, NSVL_OFFSCREEN output);
   void Blend(NSVL_OFFSCREEN mask, NSVL_OFFSCREEN image);
 

@@ -2,13 +2,15 @@
 
 #include <algorithm>
 
-#include "engine/face_model_file.h"
-
 namespace n3ds::tool {
 namespace {
 
 constexpr std::array<std::array<std::uint16_t, 3>, kMeshTriangles> kTriangles = {{
 #include "triangles.inc"
+}};
+
+constexpr std::array<std::array<float, 2>, kModelVertices> kTextureCoordinates = {{
+#include "texture_coordinates.inc"
 }};
 
 constexpr std::uint16_t kInnerLandmarkVertices[kLastInnerLandmark - kFirstInnerLandmark + 1] = {
@@ -19,6 +21,10 @@ constexpr std::uint16_t kInnerLandmarkVertices[kLastInnerLandmark - kFirstInnerL
 
 const std::array<std::array<std::uint16_t, 3>, kMeshTriangles>& MeshTriangles() {
   return kTriangles;
+}
+
+const std::array<std::array<float, 2>, kModelVertices>& MeshTextureCoordinates() {
+  return kTextureCoordinates;
 }
 
 std::size_t LandmarkVertex(std::size_t landmark) {

@@ -7,6 +7,8 @@
 #include <cstdint>
 #include <vector>
 
+#include "engine/face_model_file.h"
+
 namespace n3ds::tool {
 
 constexpr std::size_t kMeshTriangles = 3456;
@@ -19,6 +21,9 @@ constexpr std::size_t kLastInnerLandmark = 94;
 // Corner i of the unrolled mesh is vertex MeshTriangles()[i / 3][i % 3]. Counter-clockwise seen
 // from outside.
 const std::array<std::array<std::uint16_t, 3>, kMeshTriangles>& MeshTriangles();
+
+// u, v of each vertex in the mask picture, v down.
+const std::array<std::array<float, 2>, kModelVertices>& MeshTextureCoordinates();
 
 // Vertex of an inner landmark.
 std::size_t LandmarkVertex(std::size_t landmark);
