@@ -10,6 +10,7 @@ Debian's numpy, scipy and Pillow; the same bits every time.
 
 import re
 import sys
+import warnings
 from pathlib import Path
 
 import numpy as np
@@ -116,7 +117,7 @@ def blur(picture, unit):
 
 
 def noise(seed, scale, stretch=(1, 1)):
-    """Smooth noise of mean 0 and deviation 1, symmetric like the face; scale in texture widths."""
+    """Smooth noise of mean 0 and deviation 1; scale in texture widths, stretched down and right."""
     random = np.random.default_rng(seed).standard_normal((PIXELS, PIXELS))
     sigma = [max(scale * s * PIXELS, 0.5) for s in stretch]
     field = ndimage.gaussian_filter(random, sigma, mode="wrap")
@@ -170,7 +171,9 @@ def palette_of(pixels, colours, seed):
     sample = pixels[random.choice(len(pixels), 30000)]
     start = np.unique(sample, axis=0)
     start = start[random.choice(len(start), min(colours, len(start)), replace=False)]
-    palette, _ = vq.kmeans2(sample, start, iter=12, minit="matrix", missing="warn")
+    with warnings.catch_warnings():
+        warnings.simplefilter("ignore")  # a cluster without members: its colour is not used
+        palette, _ = vq.kmeans2(sample, start, iter=12, minit="matrix")
     palette = np.round(palette)
     return palette, vq.vq(pixels, palette)[0]
 

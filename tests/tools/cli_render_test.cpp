@@ -91,6 +91,50 @@ TEST_F(CliRender, RefusesWhatItCannotDraw) {
                 "missing/a.png: cannot be written");
 }
 
+TEST_F(CliRender, DrawsTheDenseMesh) {
+  const std::string track = ExampleTrack("synthetic_talk_165");
+  const auto changed = [&](const std::vector<std::string>& more) {
+    std::vector<std::string> arguments = {"render", track,     "--mode", "mask",
+                                          "--size", "320x320", "--out",  folder_.Path("a.png")};
+    arguments.insert(arguments.end(), more.begin(), more.end());
+    const Outcome outcome = Run(arguments);
+    EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
+    const Picture drawn = ReadPicture(folder_.Path("a.png"));
+    // The ground is grey with a touch of blue.
+    std::size_t count = 0;
+    for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) {
+      count += drawn.rgba[i] > drawn.rgba[i + 2] + 3 ? 1U : 0U;
+    }
+    return count;
+  };
+  Picture red(16, 16);
+  for (std::size_t i = 0; i < red.rgba.size(); ++i)
+    red.rgba[i] = i % 4 == 0 || i % 4 == 3 ? 255 : 0;
+  WritePng(console_.Path("red.png"), red);
+  const std::size_t mesh = changed({"--draw", "mesh"});
+  const std::size_t head = changed({});
+  const std::size_t mask = changed({"--draw", "landmarks", "--texture", console_.Path("red.png")});
+  EXPECT_GT(mesh, 3000u);
+  EXPECT_GT(head, mesh + 500);
+  EXPECT_NEAR(static_cast<double>(mask), static_cast<double>(mesh),
+              0.1 * static_cast<double>(mesh));
+}
+
+TEST_F(CliRender, DenseMeshesNeedMaskMode) {
+  const std::string track = ExampleTrack("real_man_270_mirror");
+  const std::string png = folder_.Path("a.png");
+  const std::string mask = N3DS_SOURCE_DIR "/examples/assets/mask_tiger.png";
+  for (const char* part : {"mesh", "wireframe", "hat,wireframe"}) {
+    ExpectFailure({"render", track, "--out", png, "--draw", part}, kFailed, "need the dense mesh");
+  }
+  ExpectFailure({"render", track, "--out", png, "--texture", mask}, kFailed, "need the dense mesh");
+  ExpectFailure({"render", track, "--out", png, "--mode", "mask", "--texture", track}, kFailed,
+                "neither a PNG nor a JPEG");
+  ExpectFailure(
+      {"render", track, "--out", png, "--mode", "mask", "--texture", folder_.Path("none.png")},
+      kFailed, "none.png: the picture cannot be opened");
+}
+
 TEST_F(CliRender, AFilmThatCannotBeMadeLeavesNothing) {
   ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--size", "64x64", "--out",
                  folder_.Path("missing/a.mp4")},

@@ -25,6 +25,8 @@ TEST_F(Cli, EveryCommandHelpsWithExamples) {
                                                   {"track"},
                                                   {"eval"},
                                                   {"render"},
+                                                  {"mask"},
+                                                  {"mesh"},
                                                   {"model"},
                                                   {"model", "info"}}) {
     std::vector<std::string> arguments = command;

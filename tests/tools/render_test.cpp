@@ -360,6 +360,137 @@ TEST(Scene, LeavesOutFacesWithoutAPose) {
   EXPECT_EQ(DrawParts(frame, parts).rgba, empty.rgba);
 }
 
+TEST(Shapes, TheOpenSkullLeavesTheFaceOut) {
+  const Mesh whole = SkullMesh();
+  const Mesh open = OpenSkullMesh();
+  EXPECT_LT(open.indices.size(), whole.indices.size());
+  EXPECT_GT(open.indices.size(), whole.indices.size() / 2);
+  std::size_t covered = 0;
+  for (const MeshPart& part : open.parts) {
+    EXPECT_EQ(part.first_index, covered);
+    covered += part.index_count;
+  }
+  EXPECT_EQ(covered, open.indices.size());
+  // Nothing before the eyes and the mouth.
+  for (std::size_t i = 0; i < open.indices.size(); i += 3) {
+    const auto& p = open.vertices[open.indices[i]].position;
+    EXPECT_FALSE(p[1] < 60 && p[2] > 45) << p[0] << " " << p[1] << " " << p[2];
+  }
+}
+
+// A talking face in mask mode, with the engine's texture coordinates.
+class MaskScene : public ::testing::Test {
+ protected:
+  MaskScene()
+      : track_(ReadTrackFile(N3DS_SOURCE_DIR "/examples/tracks/synthetic_talk_165.track.jsonl")) {
+    EngineSession session(DefaultModelPath(), track_.header, TrackMode::kMask);
+    for (std::size_t f = 0; f < 30; ++f) result_ = session.Process(track_.frames[f]);
+    coordinates_ = session.texture_coordinates();
+  }
+
+  Picture Draw(const SceneParts& parts, const std::optional<Picture>& mask = std::nullopt) const {
+    Scene scene(track_.header, DefaultModelPath(), parts, std::nullopt, 640, 480, mask);
+    return scene.Draw(result_, coordinates_);
+  }
+
+  // The landmark as the upright picture has it.
+  PixelPoint Seen(std::size_t landmark) const {
+    return UprightLandmarks(track_.header, track_.frames[29].faces[0])[landmark];
+  }
+
+  // Colour between landmarks, in the middle of them.
+  std::array<int, 3> Between(const Picture& picture, const std::vector<std::size_t>& landmarks) {
+    double x = 0;
+    double y = 0;
+    for (const std::size_t k : landmarks) {
+      x += Seen(k).x / static_cast<double>(landmarks.size());
+      y += Seen(k).y / static_cast<double>(landmarks.size());
+    }
+    const std::uint8_t* p = picture.Pixel(static_cast<int>(x), static_cast<int>(y));
+    return {p[0], p[1], p[2]};
+  }
+
+  static Picture Quarters() {
+    Picture picture(64, 64);
+    for (int y = 0; y < 64; ++y) {
+      for (int x = 0; x < 64; ++x) {
+        std::uint8_t* p = picture.Pixel(x, y);
+        p[0] = x < 32 ? 250 : 0;
+        p[1] = y < 32 ? 250 : 0;
+        p[2] = 0;
+      }
+    }
+    return picture;
+  }
+
+  Track track_;
+  FrameResult result_;
+  std::vector<float> coordinates_;
+};
+
+TEST_F(MaskScene, TheTextureIsNeitherMirroredNorTurned) {
+  const Picture drawn = Draw(kNothing, Quarters());
+  const auto left_brow = Between(drawn, {21, 22, 26, 27});
+  const auto right_brow = Between(drawn, {31, 32, 36, 37});
+  const auto left_cheek = Between(drawn, {75, 3});
+  const auto right_cheek = Between(drawn, {81, 15});
+  EXPECT_GT(left_brow[0], 100);
+  EXPECT_GT(left_brow[1], 100);
+  EXPECT_LT(right_brow[0], 20);
+  EXPECT_GT(right_brow[1], 100);
+  EXPECT_GT(left_cheek[0], 100);
+  EXPECT_LT(left_cheek[1], 20);
+  EXPECT_LT(right_cheek[0], 20);
+  EXPECT_LT(right_cheek[1], 20);
+}
+
+TEST_F(MaskScene, EyesAndAnOpenMouthShowTheGround) {
+  const Picture empty = Draw(kNothing);
+  const Picture drawn = Draw(kNothing, Quarters());
+  EXPECT_EQ(Between(drawn, {89, 93}), Between(empty, {89, 93}));
+  EXPECT_EQ(Between(drawn, {42, 48}), Between(empty, {42, 48}));
+  EXPECT_EQ(Between(drawn, {54, 60}), Between(empty, {54, 60}));
+}
+
+TEST_F(MaskScene, WhatIsTransparentLeavesNoTrace) {
+  Picture clear(64, 64);  // white
+  for (std::size_t i = 3; i < clear.rgba.size(); i += 4) clear.rgba[i] = 0;
+  EXPECT_EQ(Draw(kNothing, clear).rgba, Draw(kNothing).rgba);
+}
+
+TEST_F(MaskScene, TheWireframeCoversTheMeshThinly) {
+  SceneParts parts = kNothing;
+  const Picture empty = Draw(parts);
+  parts.mesh = true;
+  const Extent mesh = Difference(empty, Draw(parts));
+  parts.mesh = false;
+  parts.wireframe = true;
+  const Extent wires = Difference(empty, Draw(parts));
+  EXPECT_NEAR(wires.left, mesh.left, 2);
+  EXPECT_NEAR(wires.right, mesh.right, 2);
+  EXPECT_NEAR(wires.top, mesh.top, 2);
+  EXPECT_NEAR(wires.bottom, mesh.bottom, 2);
+  EXPECT_LT(wires.pixels, mesh.pixels);
+}
+
+// Stickers are made for the upright head; mask mode's matrices are for the pitched one.
+TEST_F(MaskScene, StickersSitAsInRigidMode) {
+  EngineSession session(DefaultModelPath(), track_.header, TrackMode::kRigid);
+  FrameResult rigid;
+  for (std::size_t f = 0; f < 30; ++f) rigid = session.Process(track_.frames[f]);
+  SceneParts parts = kNothing;
+  parts.glasses = true;
+  Scene scene(track_.header, DefaultModelPath(), parts, std::nullopt, 640, 480);
+  Scene plain(track_.header, DefaultModelPath(), kNothing, std::nullopt, 640, 480);
+  const Extent in_mask =
+      Difference(plain.Draw(result_, coordinates_), scene.Draw(result_, coordinates_));
+  const Extent in_rigid = Difference(plain.Draw(rigid), scene.Draw(rigid));
+  EXPECT_NEAR(in_mask.left, in_rigid.left, 12);
+  EXPECT_NEAR(in_mask.right, in_rigid.right, 12);
+  EXPECT_NEAR(in_mask.top, in_rigid.top, 12);
+  EXPECT_NEAR(in_mask.bottom, in_rigid.bottom, 12);
+}
+
 TEST(Scene, DrawsTheSamePictureTwice) {
   const FrameResult frame = FrontalHead();
   const SceneParts parts;
