@@ -95,7 +95,6 @@ TEST_P(EngineAllocation, AnExhaustedHeapLeavesTheEngineUninitialisedAndLosesNoth
 }
 
 TEST_P(EngineAllocation, WithoutMemoryForTheContextTheProcessStops) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
   ModelBytes();
   const Engine engine;
   EXPECT_DEATH(

@@ -48,7 +48,6 @@ TEST(CoreLife, ReleaseGivesTheWholePoolBack) {
 }
 
 TEST(CoreLifeDeathTest, AnExhaustedMemoryIsAFatalAssertion) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
   std::vector<unsigned char> area(sizeof(TrackingContext));
   const MHandle pool = MMemMgrCreate(area.data(), area.size());
   void* core = nullptr;
