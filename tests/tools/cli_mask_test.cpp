@@ -144,6 +144,25 @@ TEST_F(CliMask, TurnsThePhotoUpright) {
   EXPECT_LT(light_y / counts[2], dark_y / counts[3] - 10);
 }
 
+// The mean face becomes the person's while the landmarks are held.
+TEST_F(CliMask, TheShapeSettles) {
+  const std::string photo = Save("photo.png", Plain(512, 512, 128));
+  const std::string texture = Save("texture.png", FourColours());
+  const auto settled = [&](const char* frames) {
+    return Masked(photo, astronaut_, texture, {"--settle", frames}).rgba;
+  };
+  const auto changed = [](const std::vector<std::uint8_t>& a, const std::vector<std::uint8_t>& b) {
+    std::size_t count = 0;
+    for (std::size_t i = 0; i < a.size(); ++i) count += a[i] != b[i] ? 1U : 0U;
+    return count;
+  };
+  const auto at_once = settled("0");
+  const auto after_20 = settled("20");
+  const auto after_40 = settled("40");
+  EXPECT_GT(changed(at_once, after_20), 1000u);
+  EXPECT_LT(changed(after_20, after_40), changed(at_once, after_20) / 4);
+}
+
 TEST_F(CliMask, EveryFaceGetsItsMask) {
   const std::string photo = Save("photo.png", Plain(1920, 1398, 100));
   const Outcome outcome = Run({"mask", photo, ExampleTrack("photo_group_5"), "--texture",
@@ -215,6 +234,8 @@ TEST_F(CliMask, RefusesWhatItCannotUse) {
   ExpectFailure({"mask", photo, astronaut_, "--texture", texture, "--out", png, "--format", "rgb"},
                 kUsage, "--format");
   ExpectFailure({"mask", photo, astronaut_, "--out", png}, kUsage, "--texture is required");
+  ExpectFailure({"mask", photo, astronaut_, "--texture", texture, "--out", png, "--settle", "-1"},
+                kUsage, "--settle");
 }
 
 struct Obj {

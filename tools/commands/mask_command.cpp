@@ -37,6 +37,7 @@ struct MaskOptions {
   std::string out;
   std::string format = "bgr24";
   std::optional<std::int64_t> frame;
+  std::size_t settle = 20;
 };
 
 // The photo as the landmarks see it: their pixels are those of the track's picture.
@@ -62,6 +63,7 @@ void RunMaskCommand(const MaskOptions& options) {
 
   CoreSession session(options.model, track.header);
   for (std::size_t f = 0; f <= chosen; ++f) session.Process(track.frames[f]);
+  for (std::size_t k = 0; k < options.settle; ++k) session.Process(track.frames[chosen]);
   CameraPicture image = Formats().at(options.format)(photo);
   for (const std::size_t face : session.FarToNear()) {
     CameraPicture mask = CameraPicture::ClearBgra32(image.width(), image.height());
@@ -107,6 +109,13 @@ void AddMaskCommand(CLI::App& app) {
                    "Number of the photo's frame, by default the first with a face; the frames\n"
                    "before it are tracked too")
       ->type_name("N");
+  command
+      ->add_option("--settle", options->settle,
+                   "For how many more frames the photo's landmarks are held before it is drawn: a\n"
+                   "new face has the mean face's shape, which becomes the person's by and by")
+      ->type_name("N")
+      ->check(CLI::Range(0, 1000))
+      ->capture_default_str();
   command->add_option("--model", options->model, "Face-model file")
       ->type_name("FILE")
       ->capture_default_str();
