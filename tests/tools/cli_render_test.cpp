@@ -32,6 +32,18 @@ TEST_F(CliRender, MakesAContactSheet) {
   EXPECT_EQ((picture.width + 4) / 164 * ((picture.height + 4) / 94), 6);
 }
 
+TEST_F(CliRender, ShowsTheHeadsAlone) {
+  const Outcome outcome = Run({"render", ExampleTrack("synthetic_talk_165"), "--closeup", "--size",
+                               "200x240", "--out", folder_.Path("a.png")});
+  ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
+  const Picture picture = ReadPicture(folder_.Path("a.png"));
+  EXPECT_TRUE(picture.width == 200 || picture.height == 240);
+  EXPECT_LT(picture.width, picture.height);  // the track's pictures are broad, a head is not
+  const Outcome film = Run({"render", ExampleTrack("synthetic_talk_165"), "--closeup", "--size",
+                            "99x101", "--every", "10", "--out", folder_.Path("a.mp4")});
+  EXPECT_EQ(film.exit_code, 0) << film.err;
+}
+
 TEST_F(CliRender, MakesAFolderOfFrames) {
   const Outcome outcome = Run({"render", ExampleTrack("real_man_270_mirror"), "--every", "15",
                                "--size", "64x64", "--out", folder_.Path("frames")});

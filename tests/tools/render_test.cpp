@@ -13,6 +13,7 @@
 #include "render/picture.h"
 #include "render/scene.h"
 #include "render/shapes.h"
+#include "render/view.h"
 #include "scratch_folder.h"
 #include "tracks/upright.h"
 
@@ -209,6 +210,63 @@ TEST(Shapes, SkullLiesUnderTheForehead) {
     const double y = (p[1] - 45) / 87;
     const double z = (p[2] + 1) / 94;
     EXPECT_GT(x * x + y * y + z * z, 0.97) << p[0] << " " << p[1] << " " << p[2];
+  }
+}
+
+TEST(View, TheWholePictureGoesIntoTheBox) {
+  TrackHeader header;
+  header.width = 400;
+  header.height = 1000;
+  header.degree = 90;  // upright 1000 x 400
+  View view = WholeView(header, Size{501, 900}, 1280);
+  EXPECT_EQ(view.shown.width, 501);
+  EXPECT_EQ(view.shown.height, 200);
+  EXPECT_EQ(view.whole.width, 501);
+  view.MakeEven();
+  EXPECT_EQ(view.shown.width, 500);
+  view = WholeView(header, std::nullopt, 500);
+  EXPECT_EQ(view.shown.width, 500);
+  EXPECT_EQ(WholeView(header, std::nullopt, 1280).shown.width, 1000);
+}
+
+TEST(View, ACloseupHoldsTheHeads) {
+  Track track = ReadTrackFile(N3DS_SOURCE_DIR "/examples/tracks/real_man_270_mirror.track.jsonl");
+  const View view = CloseView(track, {0, 30}, Size{300, 400}, 1280);
+  EXPECT_LE(view.shown.width, 300);
+  EXPECT_LE(view.shown.height, 400);
+  EXPECT_TRUE(view.shown.width >= 299 || view.shown.height >= 399);
+  EXPECT_GT(view.whole.width, view.shown.width);
+  EXPECT_LE(view.left + view.shown.width, view.whole.width);
+  EXPECT_LE(view.top + view.shown.height, view.whole.height);
+  const double scale = view.whole.width / static_cast<double>(track.header.upright_width());
+  for (const std::size_t f : {0, 30}) {
+    for (const PixelPoint& p : UprightLandmarks(track.header, track.frames[f].faces[0])) {
+      EXPECT_GE(p.x * scale, view.left);
+      EXPECT_LE(p.x * scale, view.left + view.shown.width);
+      EXPECT_GE(p.y * scale, view.top);
+      EXPECT_LE(p.y * scale, view.top + view.shown.height);
+    }
+  }
+  track.frames[0].faces.clear();
+  const View without = CloseView(track, {0}, Size{300, 400}, 1280);
+  EXPECT_EQ(without.shown.width, 300);
+  EXPECT_EQ(without.whole.width, 300);
+}
+
+TEST(View, CutsItsPart) {
+  View view;
+  view.whole = {9, 6};
+  view.left = 2;
+  view.top = 1;
+  view.shown = {5, 3};
+  const Picture whole = Pattern(9, 6);
+  const Picture cut = view.Cut(whole);
+  ASSERT_EQ(cut.width, 5);
+  ASSERT_EQ(cut.height, 3);
+  for (int y = 0; y < 3; ++y) {
+    for (int x = 0; x < 5; ++x) {
+      EXPECT_TRUE(std::equal(cut.Pixel(x, y), cut.Pixel(x, y) + 4, whole.Pixel(x + 2, y + 1)));
+    }
   }
 }
 

@@ -21,13 +21,13 @@
 #include "render/picture.h"
 #include "render/scene.h"
 #include "render/video_writer.h"
+#include "render/view.h"
 #include "support/progress.h"
 #include "tracks/track_file.h"
 
 namespace n3ds::tool {
 namespace {
 
-constexpr int kLargestSide = 8192;
 constexpr int kDefaultSide = 1280;  // largest side of a picture or film when no size is asked for
 constexpr int kDefaultTile = 320;   // of a tile on a contact sheet
 
@@ -42,6 +42,7 @@ struct RenderOptions {
   std::optional<std::int64_t> frame;
   std::size_t contact_sheet = 0;
   std::size_t every = 1;
+  bool closeup = false;
 };
 
 bool EndsWith(const std::string& text, const std::string& ending) {
@@ -49,33 +50,17 @@ bool EndsWith(const std::string& text, const std::string& ending) {
          text.compare(text.size() - ending.size(), ending.size(), ending) == 0;
 }
 
-struct Size {
-  int width = 0;
-  int height = 0;
-};
-
 // "640x360" as a box, or nothing.
 std::optional<Size> ParseSize(const std::string& text) {
   if (text.empty()) return std::nullopt;
   Size size;
   char rest = 0;
   if (std::sscanf(text.c_str(), "%dx%d%c", &size.width, &size.height, &rest) != 2 ||
-      size.width < 16 || size.height < 16 || size.width > kLargestSide ||
-      size.height > kLargestSide) {
+      size.width < 16 || size.height < 16 || size.width > kLargestDrawnSide ||
+      size.height > kLargestDrawnSide) {
     throw Error("--size " + text + ": WIDTHxHEIGHT from 16x16 to 8192x8192 is needed");
   }
   return size;
-}
-
-// The largest size with the track's proportions inside the box; without a box, the picture's own
-// size, reduced to `default_side`.
-Size FitInto(const TrackHeader& header, const std::optional<Size>& box, int default_side) {
-  const double w = header.upright_width();
-  const double h = header.upright_height();
-  const double scale = box ? std::min(box->width / w, box->height / h)
-                           : std::min(1.0, default_side / std::max(w, h));
-  return {std::max(1, static_cast<int>(std::lround(w * scale))),
-          std::max(1, static_cast<int>(std::lround(h * scale)))};
 }
 
 SceneParts DefaultParts(const RenderOptions& options) {
@@ -124,92 +109,88 @@ std::optional<Picture> LoadBackground(const RenderOptions& options, const TrackH
   return Upright(delivered, header.degree, header.mirror == 1);
 }
 
-// Runs the whole track, because tracking is a sequence in time, and draws the chosen frames
-// (indices in ascending order).
-void DrawFrames(const Track& track, const RenderOptions& options, Scene& scene,
-                const std::vector<std::size_t>& chosen,
-                const std::function<void(const FrameResult&, const Picture&)>& use) {
-  EngineSession session(options.engine.model, track.header, options.engine.mode());
-  Progress progress("drawing " + track.name, chosen.size());
-  std::size_t next = 0;
-  for (std::size_t f = 0; f < track.frames.size() && next < chosen.size(); ++f) {
-    const FrameResult result = session.Process(track.frames[f]);
-    if (f != chosen[next]) continue;
-    CheckFrame(options.track, result);
-    use(result, scene.Draw(result, session.texture_coordinates()));
-    progress.Step();
-    ++next;
-  }
-}
-
-std::vector<std::size_t> EveryNth(const Track& track, std::size_t every) {
+// Frames to draw, by their index, in ascending order.
+std::vector<std::size_t> ChooseFrames(const Track& track, const RenderOptions& options) {
+  if (options.contact_sheet > 0) return EvenlySpaced(track.frames.size(), options.contact_sheet);
+  if (EndsWith(options.out, ".png")) return {ChosenFrame(track, options.track, options.frame)};
   std::vector<std::size_t> chosen;
-  for (std::size_t f = 0; f < track.frames.size(); f += every) chosen.push_back(f);
+  for (std::size_t f = 0; f < track.frames.size(); f += options.every) chosen.push_back(f);
   return chosen;
 }
 
-void RenderPicture(const Track& track, const RenderOptions& options, Scene& scene) {
-  DrawFrames(track, options, scene, {ChosenFrame(track, options.track, options.frame)},
-             [&](const FrameResult&, const Picture& picture) { WritePng(options.out, picture); });
-}
+// One drawing of a track's frames.
+class Drawing {
+ public:
+  Drawing(const Track& track, const RenderOptions& options, const SceneParts& parts)
+      : track_(track), options_(options), chosen_(ChooseFrames(track, options)) {
+    const std::optional<Size> box = ParseSize(options.size);
+    const int side = options.contact_sheet > 0 ? kDefaultTile : kDefaultSide;
+    view_ =
+        options.closeup ? CloseView(track, chosen_, box, side) : WholeView(track.header, box, side);
+    if (EndsWith(options.out, ".mp4")) view_.MakeEven();
+    std::optional<Picture> mask;
+    if (!options.texture.empty()) mask = ReadPicture(options.texture);
+    scene_ = std::make_unique<Scene>(track.header, options.engine.model, parts,
+                                     LoadBackground(options, track.header), view_.whole.width,
+                                     view_.whole.height, mask);
+  }
 
-void RenderContactSheet(const Track& track, const RenderOptions& options, Scene& scene,
-                        const Size& size) {
-  const auto chosen = EvenlySpaced(track.frames.size(), options.contact_sheet);
-  ContactSheet sheet(chosen.size(), size.width, size.height);
-  DrawFrames(track, options, scene, chosen, [&](const FrameResult& result, const Picture& picture) {
-    sheet.Add(picture, result.number);
-  });
-  WritePng(options.out, sheet.picture());
-}
+  void Run() {
+    if (EndsWith(options_.out, ".mp4")) {
+      VideoWriter film(options_.out, view_.shown.width, view_.shown.height,
+                       track_.header.fps / static_cast<double>(options_.every));
+      DrawFrames([&](const FrameResult&, const Picture& picture) { film.Add(picture); });
+      film.Finish();
+    } else if (options_.contact_sheet > 0) {
+      ContactSheet sheet(chosen_.size(), view_.shown.width, view_.shown.height);
+      DrawFrames([&](const FrameResult& result, const Picture& picture) {
+        sheet.Add(picture, result.number);
+      });
+      WritePng(options_.out, sheet.picture());
+    } else if (EndsWith(options_.out, ".png")) {
+      DrawFrames(
+          [&](const FrameResult&, const Picture& picture) { WritePng(options_.out, picture); });
+    } else {
+      MakeFolder(options_.out);
+      DrawFrames([&](const FrameResult& result, const Picture& picture) {
+        WritePng(options_.out + FrameName(result.number, ".png"), picture);
+      });
+    }
+  }
 
-void RenderFilm(const Track& track, const RenderOptions& options, Scene& scene, const Size& size) {
-  VideoWriter film(options.out, size.width, size.height,
-                   track.header.fps / static_cast<double>(options.every));
-  DrawFrames(track, options, scene, EveryNth(track, options.every),
-             [&](const FrameResult&, const Picture& picture) { film.Add(picture); });
-  film.Finish();
-}
+ private:
+  // Runs the whole track, because tracking is a sequence in time, and draws the chosen frames.
+  void DrawFrames(const std::function<void(const FrameResult&, const Picture&)>& use) {
+    EngineSession session(options_.engine.model, track_.header, options_.engine.mode());
+    Progress progress("drawing " + track_.name, chosen_.size());
+    std::size_t next = 0;
+    for (std::size_t f = 0; f < track_.frames.size() && next < chosen_.size(); ++f) {
+      const FrameResult result = session.Process(track_.frames[f]);
+      if (f != chosen_[next]) continue;
+      CheckFrame(options_.track, result);
+      use(result, view_.Cut(scene_->Draw(result, session.texture_coordinates())));
+      progress.Step();
+      ++next;
+    }
+  }
 
-void RenderFolder(const Track& track, const RenderOptions& options, Scene& scene) {
-  MakeFolder(options.out);
-  DrawFrames(track, options, scene, EveryNth(track, options.every),
-             [&](const FrameResult& result, const Picture& picture) {
-               WritePng(options.out + FrameName(result.number, ".png"), picture);
-             });
-}
+  const Track& track_;
+  const RenderOptions& options_;
+  std::vector<std::size_t> chosen_;
+  View view_;
+  std::unique_ptr<Scene> scene_;
+};
 
 void RunRenderCommand(const RenderOptions& options) {
   const SceneParts parts = ParseParts(options);
   CheckMode(options, parts);
   const Track track = ReadTrackFile(options.track);
-  const bool png = EndsWith(options.out, ".png");
-  const bool film = EndsWith(options.out, ".mp4");
   const bool sheet = options.contact_sheet > 0;
-  if (!png && (sheet || options.frame)) {
+  if (!EndsWith(options.out, ".png") && (sheet || options.frame)) {
     throw Error("--frame and --contact-sheet make one picture: --out must end in .png");
   }
   if (sheet && options.frame) throw Error("--frame and --contact-sheet exclude each other");
-
-  Size size = FitInto(track.header, ParseSize(options.size), sheet ? kDefaultTile : kDefaultSide);
-  if (film) {
-    // The film's format halves the colour's resolution.
-    size.width = std::max(2, size.width / 2 * 2);
-    size.height = std::max(2, size.height / 2 * 2);
-  }
-  std::optional<Picture> mask;
-  if (!options.texture.empty()) mask = ReadPicture(options.texture);
-  Scene scene(track.header, options.engine.model, parts, LoadBackground(options, track.header),
-              size.width, size.height, mask);
-  if (film) {
-    RenderFilm(track, options, scene, size);
-  } else if (sheet) {
-    RenderContactSheet(track, options, scene, size);
-  } else if (png) {
-    RenderPicture(track, options, scene);
-  } else {
-    RenderFolder(track, options, scene);
-  }
+  Drawing(track, options, parts).Run();
   std::printf("%s\n", options.out.c_str());
 }
 
@@ -249,6 +230,7 @@ void AddRenderCommand(CLI::App& app) {
       ->capture_default_str();
   command->add_option("--size", options->size, "Box into which a picture, film or tile is fitted")
       ->type_name("WIDTHxHEIGHT");
+  command->add_flag("--closeup", options->closeup, "Show the heads alone");
   command
       ->add_option("--draw", options->draw,
                    "What to draw: glasses, hat, axes, landmarks, head (all by default; the head\n"

@@ -69,9 +69,9 @@ std::vector<Triangle> VisibleTriangles(const std::vector<Vector3>& seen) {
   }
   std::stable_sort(by_depth.begin(), by_depth.end(),
                    [](const auto& left, const auto& right) { return left.first < right.first; });
-  std::vector<Triangle> triangles;
-  for (const auto& [depth, triangle] : by_depth) triangles.push_back(triangle);
-  triangles.resize(kMeshTriangles, Triangle{});
+  std::vector<Triangle> triangles(kMeshTriangles, Triangle{});
+  std::transform(by_depth.begin(), by_depth.end(), triangles.begin(),
+                 [](const auto& entry) { return entry.second; });
   return triangles;
 }
 
