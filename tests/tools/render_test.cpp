@@ -4,10 +4,12 @@
 
 #include <algorithm>
 #include <cmath>
+#include <filesystem>
 #include <limits>
 #include <numeric>
 
 #include "engine/engine_session.h"
+#include "engine/mesh_tables.h"
 #include "render/contact_sheet.h"
 #include "render/obj_file.h"
 #include "render/picture.h"
@@ -182,6 +184,36 @@ TEST(Assets, GlassesStandBeforeTheFace) {
       if (distance > 3) continue;
       EXPECT_GT(p[2], skin.position[2]) << p[0] << " " << p[1];
     }
+  }
+}
+
+// Mean of some landmarks' places in a mask picture, as its alpha there.
+int MaskAlpha(const Picture& mask, std::size_t first, std::size_t last) {
+  double u = 0;
+  double v = 0;
+  for (std::size_t k = first; k <= last; ++k) {
+    u += static_cast<double>(MeshTextureCoordinates()[LandmarkVertex(k)][0]);
+    v += static_cast<double>(MeshTextureCoordinates()[LandmarkVertex(k)][1]);
+  }
+  const double count = static_cast<double>(last - first + 1);
+  return mask.Pixel(static_cast<int>(u / count * mask.width),
+                    static_cast<int>(v / count * mask.height))[3];
+}
+
+// A mask drawn for another layout would close an eye or the mouth.
+TEST(Assets, MasksFitTheTextureLayout) {
+  for (const char* name : {"carnival", "tiger", "gold"}) {
+    const std::string path = std::string(N3DS_SOURCE_DIR "/examples/assets/mask_") + name + ".png";
+    const Picture mask = ReadPicture(path);
+    EXPECT_EQ(mask.width, 512);
+    EXPECT_EQ(mask.height, 512);
+    EXPECT_LT(std::filesystem::file_size(path), 250000u);
+    EXPECT_EQ(MaskAlpha(mask, 39, 50), 0) << name;  // eyes
+    EXPECT_EQ(MaskAlpha(mask, 51, 62), 0) << name;
+    EXPECT_EQ(MaskAlpha(mask, 87, 94), 0) << name;    // mouth
+    EXPECT_GT(MaskAlpha(mask, 19, 28), 250) << name;  // brows
+    EXPECT_GT(MaskAlpha(mask, 29, 38), 250) << name;
+    EXPECT_EQ(mask.Pixel(0, 0)[3], 0) << name;
   }
 }
 
