@@ -15,6 +15,7 @@
 namespace n3ds::tool {
 namespace {
 
+using ::testing::DoubleNear;
 using ::testing::Each;
 using ::testing::IsEmpty;
 using ::testing::Le;
@@ -118,6 +119,23 @@ TEST_F(MeshMetrics, DistancesAreInPercentOfThePupils) {
   EXPECT_NEAR(Percentile(Judge().distances, 0.5), 50, 0.71);
   seen_.points[192] += 100;
   EXPECT_NEAR(Percentile(Judge().distances, 0.5), 25, 0.36);
+}
+
+TEST_F(MeshMetrics, TrueDistancesAreFromWhereTheLandmarksTrulyAre) {
+  SeeTheMesh();
+  EXPECT_THAT(Judge().true_distances, IsEmpty());
+  header_.focal = 1000;
+  seen_.truth = TrackTruth{};
+  seen_.truth->rotation = {1, 0, 0, 0, -1, 0, 0, 0, -1};
+  seen_.truth->points3d.assign(303, 500);
+  for (std::size_t k = kFirstInnerLandmark; k <= kLastInnerLandmark; ++k) {
+    // 12 pixels right of and 5 above where the mesh is drawn.
+    seen_.truth->points3d[3 * k] = (Drawn(k).x + 12 - 640) / 2;
+    seen_.truth->points3d[3 * k + 1] = (Drawn(k).y - 5 - 480) / 2;
+  }
+  const MeshScore score = Judge();
+  EXPECT_THAT(score.true_distances, SizeIs(76));
+  EXPECT_THAT(score.true_distances, Each(DoubleNear(13, 1e-9)));
 }
 
 TEST_F(MeshMetrics, HeadsTurnedTooFarAreOnlyCounted) {

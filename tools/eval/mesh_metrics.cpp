@@ -49,6 +49,13 @@ double Distance(const PixelPoint& a, const PixelPoint& b) {
   return std::hypot(a.x - b.x, a.y - b.y);
 }
 
+// Where a landmark of a truth with 3-D points appears in the upright picture.
+PixelPoint TruePlace(const TrackHeader& header, const TrackTruth& truth, std::size_t landmark) {
+  const double* p = &truth.points3d[3 * landmark];
+  return {*header.focal * p[0] / p[2] + header.upright_width() / 2.0,
+          *header.focal * p[1] / p[2] + header.upright_height() / 2.0};
+}
+
 }  // namespace
 
 void MeshScore::Add(const MeshScore& other) {
@@ -59,6 +66,7 @@ void MeshScore::Add(const MeshScore& other) {
   not_finite += other.not_finite;
   folded += other.folded;
   append(distances, other.distances);
+  append(true_distances, other.true_distances);
   append(mouth_seen, other.mouth_seen);
   append(mouth_of_mesh, other.mouth_of_mesh);
 }
@@ -132,8 +140,12 @@ void MeshJudge::AddDistances(const TrackHeader& header, const TrackFace& face,
     const Vector3 v = VertexAt(vertices, LandmarkVertex(landmark));
     return ProjectToPicture(result, header, v[0], v[1], v[2]);
   };
+  const bool is_known = face.truth && !face.truth->points3d.empty() && header.focal;
   for (std::size_t k = kFirstInnerLandmark; k <= kLastInnerLandmark; ++k) {
     score.distances.push_back(100 * Distance(drawn(k), seen[k]) / pupils);
+    if (!is_known) continue;
+    score.true_distances.push_back(100 * Distance(drawn(k), TruePlace(header, *face.truth, k)) /
+                                   pupils);
   }
   score.mouth_seen.push_back(100 * Distance(seen[kInnerLips[0]], seen[kInnerLips[1]]) / pupils);
   score.mouth_of_mesh.push_back(100 * Distance(drawn(kInnerLips[0]), drawn(kInnerLips[1])) /

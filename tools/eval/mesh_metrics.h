@@ -22,11 +22,14 @@ constexpr double kFoldDegrees = 150;
 
 // Lengths are in percent of the distance between the pupils in the same picture.
 struct MeshScore {
-  std::size_t faces = 0;           // with a finite pose and mesh, at any yaw
-  std::size_t not_finite = 0;      // faces with a number that is none
-  std::size_t folded = 0;          // faces with a fold
-  std::vector<double> distances;   // landmark to its vertex, inner landmarks, yaw within kMeshYaw
-  std::vector<double> mouth_seen;  // between the middles of the inner lips, in the landmarks
+  std::size_t faces = 0;          // with a finite pose and mesh, at any yaw
+  std::size_t not_finite = 0;     // faces with a number that is none
+  std::size_t folded = 0;         // faces with a fold
+  std::vector<double> distances;  // landmark to its vertex, inner landmarks, yaw within kMeshYaw
+  // The same from where the landmarks truly are, in the faces whose truth tells it: without the
+  // detector's noise and rounding.
+  std::vector<double> true_distances;
+  std::vector<double> mouth_seen;     // between the middles of the inner lips, in the landmarks
   std::vector<double> mouth_of_mesh;  // the same in the mesh, face by face
 
   void Add(const MeshScore& other);

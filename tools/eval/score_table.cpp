@@ -44,8 +44,12 @@ std::vector<std::string> Row(const std::string& name, const Score& score) {
 }
 
 std::vector<std::string> MeshCells(const MeshScore& mesh) {
-  return {Cell(mesh.distances, 0.5, 2), Cell(mesh.distances, 0.95, 2),
-          std::to_string(mesh.not_finite), std::to_string(mesh.folded),
+  return {Cell(mesh.distances, 0.5, 2),
+          Cell(mesh.distances, 0.95, 2),
+          Cell(mesh.true_distances, 0.5, 2),
+          Cell(mesh.true_distances, 0.95, 2),
+          std::to_string(mesh.not_finite),
+          std::to_string(mesh.folded),
           mesh.mouth_seen.empty() ? "-" : Decimal(mesh.MouthGain(), 2)};
 }
 
@@ -73,6 +77,7 @@ const char kMeshColumnsLegend[] =
     "mesh       distance of the inner landmarks to their vertices of the dense mesh in the\n"
     "           picture, percent of the distance between the pupils, median and 95th percentile\n"
     "           over the heads turned by at most 40 degrees\n"
+    "true       the same from where the landmarks truly are, in the frames that tell it\n"
     "broken     faces with a mesh that is not finite\n"
     "folded     faces with a triangle turned over, by more than 150 degrees against a neighbour "
     "or\n"
@@ -83,7 +88,7 @@ TextTable ScoreTable(const NamedScores& scores, const std::vector<MeshScore>& me
   std::vector<std::string> head = {"track", "faces", "lost", "swaps",   "jumps",  "rot20",
                                    "p95",   "rot40", "p95",  "rot60",   "p95",    "across",
                                    "p95",   "depth", "p95",  "jit deg", "jit mm", "lag"};
-  if (!meshes.empty()) Append({"mesh", "p95", "broken", "folded", "mouth"}, head);
+  if (!meshes.empty()) Append({"mesh", "p95", "true", "p95", "broken", "folded", "mouth"}, head);
   TextTable table(head);
   Score all;
   MeshScore all_meshes;
