@@ -10,6 +10,9 @@ ROW = 2.0  # mm between the rows in which an outline is read
 REACH = 3.0  # mm, how near a candidate has to be
 TEMPLES = 22.0  # mm above the tragions: the ends of the outline
 TOP = 32.0  # nodding heads bring skin above the temples to the outline's ends
+BESIDE = (13.0, 40.0)  # mm from the middle line: the hollows beside nose and mouth, round the eyes
+BESIDE_LOW = -40.0
+FOREHEAD = 45.0  # height above which nothing of the outline comes near
 EAR = 11.0  # depth at which outlines end before the ear
 SEED = 534
 
@@ -33,14 +36,16 @@ def outline_skin(points, top=TEMPLES):
 
 
 def spare(points):
-    """How fit each vertex is as a candidate that is never asked for: above zero on the outline skin
-    and 4 mm round it, else falling with the distance on the front of the cheek, where no outline
-    and no edge of the hull comes near; lowest elsewhere."""
-    above_jaw = points[:, 1] > np.interp(points[:, 2], *JAW_BORDER.T)
+    """How fit each vertex is as a candidate that no outline landmark should ever find.
+
+    That is its distance from the outline skin, on the forehead and beside eyes, nose and mouth.
+    Nose, lips and chin are out: they stand at the rim of the picture when the head is turned away,
+    and would draw the landmarks of the far cheek to them.
+    """
+    across, height = np.abs(points[:, 0]), points[:, 1]
+    beside = (across > BESIDE[0]) & (across < BESIDE[1]) & (height > BESIDE_LOW)
     distance = cKDTree(points[outline_skin(points, TOP)]).query(points)[0]
-    front = above_jaw & (points[:, 1] < 15.0) & (points[:, 1] > -66.0)
-    fitness = np.where(front, -1.0 - distance / 1000.0, -2.0)
-    return np.where(above_jaw & (distance < 4.0) & (points[:, 1] < TOP), 1.0, fitness)
+    return np.where(beside | (height > FOREHEAD), distance, -1.0)
 
 
 def seen_from(points, yaw, pitch):
@@ -63,18 +68,19 @@ def choose(points, mirror, must, never, wanted):
     """`wanted` vertices, symmetric: `must` and their mirrors, and the rest where they do no harm.
 
     Candidates between the rows of the outline landmarks would let the landmarks slide along the
-    outline, so what the table has to spare lies where no outline and no edge of the hull comes
-    near. `never` are out. Vertices on the middle line come in twos, so that the number stays even.
+    outline, so what the table has to spare lies as far from the outlines as the face allows.
+    `never` are out. Vertices on the middle line come in twos, so that the number stays even.
     """
     chosen = set(must) | {int(mirror[v]) for v in must}
     barred = set(never) | {int(mirror[v]) for v in never}
     if chosen & barred:
         raise ValueError("a vertex is both wanted and barred")
     fitness = spare(points)
+    fitness = np.round(fitness + fitness[mirror], 6)
     alone = mirror == np.arange(len(mirror))
     odd = (wanted - len(chosen)) % 2
     while len(chosen) < wanted:
-        gain = np.where(fitness > 0, -5.0, np.round(fitness + fitness[mirror], 6))
+        gain = fitness.copy()
         gain[list(chosen | barred)] = -9.0
         room = wanted - len(chosen)
         if odd and room == 1:
