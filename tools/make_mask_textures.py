@@ -88,7 +88,8 @@ def filled(polygon):
 
 def distance(inside):
     """Signed distance to an edge in texture widths, negative inside."""
-    return (ndimage.distance_transform_edt(~inside) - ndimage.distance_transform_edt(inside)) / PIXELS
+    outwards = ndimage.distance_transform_edt(~inside)
+    return (outwards - ndimage.distance_transform_edt(inside)) / PIXELS
 
 
 def step(value, low, high):
