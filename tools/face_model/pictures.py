@@ -26,7 +26,7 @@ def main():
     rows = [row([view(model, model.mean + s * 2.5 * model.identity[k], y)
                  for s in (-1, 1) for y in (0, 40)]) for k in range(6)]
     save(FOLDER / "identity.png", np.concatenate(rows), 64)
-    faces = [np.concatenate([view(model, model.mean + move, y) for y in (0, 45)])
+    faces = [np.concatenate([view(model, model.mean + move, y, span=245.0) for y in (0, 45)])
              for move in model.expression]
     rows = [row(faces[k:k + 5]) for k in range(0, 20, 5)]
     save(FOLDER / "expressions.png", np.concatenate(rows), 64)
