@@ -3,7 +3,6 @@
 #include <cmath>
 #include <cstdint>
 #include <map>
-#include <optional>
 
 namespace n3ds::tool {
 namespace {

@@ -1,6 +1,8 @@
 #include "one_euro_pose.h"
 
 #include <cmath>
+#include <cstdint>
+#include <map>
 
 namespace n3ds::tool {
 namespace {

@@ -5,7 +5,6 @@
 
 #include <array>
 #include <cstddef>
-#include <map>
 
 #include "eval/metrics.h"
 

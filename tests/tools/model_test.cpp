@@ -293,6 +293,13 @@ TEST(ModelChecks, TextureFindsAFaceTheLayoutDoesNotFit) {
   EXPECT_THAT(Failures(CheckTexture, model), ElementsAre("ratio of the two, 95th percentile"));
 }
 
+TEST(ModelChecks, AFaceWithoutExtentFailsWhereShapeCounts) {
+  const auto failed = FailedNames(CheckModel(EmptyModel(), kIdentityUnit));
+  EXPECT_THAT(failed, Contains("smallest triangle of the mean, mm2"));
+  EXPECT_THAT(failed, Contains("sharpest edge of the mean, degrees"));
+  EXPECT_THAT(failed, Contains("ratio of the two, 95th percentile"));
+}
+
 TEST(CheckReport, PrintsOneLineACheck) {
   CheckReport report;
   report.Section("Size");

@@ -1,6 +1,7 @@
 // Random people, the same on every machine.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <random>
 

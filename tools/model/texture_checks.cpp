@@ -1,5 +1,7 @@
 #include <algorithm>
+#include <array>
 #include <cmath>
+#include <limits>
 #include <set>
 #include <string>
 
@@ -54,14 +56,19 @@ struct Stretch {
   double smaller;
 };
 
+// Of a triangle without area in space.
+constexpr Stretch kTorn = {std::numeric_limits<double>::infinity(), 0};
+
 // How much the layout enlarges a triangle along its two principal directions: singular values of
 // the map from the triangle's own plane to the texture.
 Stretch StretchOf(const Triangle& t, const Points& points) {
   const Point3 ab = points[t[1]] - points[t[0]];
   const Point3 ac = points[t[2]] - points[t[0]];
   const double base = Length(ab);
+  if (base == 0) return kTorn;
   const double along = Dot(ab, ac) / base;
   const double height = Length(Cross(ab, ac)) / base;
+  if (height == 0) return kTorn;
   const Place& origin = FaceTexture()[t[0]];
   std::array<std::array<double, 2>, 2> map{};  // column by column
   for (std::size_t k = 0; k < 2; ++k) {
