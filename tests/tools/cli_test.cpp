@@ -196,18 +196,19 @@ TEST_F(Cli, EvalAddsColumnsForMeshes) {
   int rows = 0;
   while (std::getline(lines, line)) {
     ++rows;
-    EXPECT_EQ(std::count(line.begin(), line.end(), ','), 22) << line;
+    EXPECT_EQ(std::count(line.begin(), line.end(), ','), 24) << line;
     if (rows == 1) {
-      EXPECT_THAT(line, ::testing::EndsWith("mesh,p95,broken,folded,mouth"));
+      EXPECT_THAT(line, ::testing::EndsWith("mesh,p95,true,p95,broken,folded,mouth"));
       continue;
     }
     std::vector<std::string> cells;
     std::istringstream words(line);
     for (std::string cell; std::getline(words, cell, ',');) cells.push_back(cell);
     EXPECT_LT(std::stod(cells[18]), 4) << line;  // median, percent
-    EXPECT_EQ(cells[20], "0");
-    EXPECT_EQ(cells[21], "0");
-    EXPECT_GT(std::stod(cells[22]), 0.5) << line;  // the mouth opens with the landmarks'
+    EXPECT_EQ(cells[20], "-");  // the example tracks carry no true points
+    EXPECT_EQ(cells[22], "0");
+    EXPECT_EQ(cells[23], "0");
+    EXPECT_GT(std::stod(cells[24]), 0.5) << line;  // the mouth opens with the landmarks'
   }
   EXPECT_EQ(rows, 4);
 }
