@@ -150,6 +150,9 @@ typedef struct N3DS_2D_TEXTURE_MASK {
 } N3DS_2D_TEXTURE_MASK;
 
 /* Draws a mask picture onto a tracked face of the last mask frame, in upright image coordinates.
+ * Triangles are drawn in the order of the list and later ones overwrite earlier ones: where a
+ * turned face hides a part of itself, hand over a list sorted from far to near. The last row and
+ * column of the output are never drawn.
  *   output     BGRA picture, transparent where the face is not. If plane[0] is null it is set up as
  *              width x height and its buffer taken from the core's memory; release it with MMemFree
  *              and the handle given to N3DS_Init. Otherwise its own size and pitch hold.

@@ -205,7 +205,7 @@ TEST_F(Cli, EvalAddsColumnsForMeshes) {
     std::istringstream words(line);
     for (std::string cell; std::getline(words, cell, ',');) cells.push_back(cell);
     EXPECT_LT(std::stod(cells[18]), 4) << line;  // median, percent
-    EXPECT_EQ(cells[20], "-");  // the example tracks carry no true points
+    EXPECT_EQ(cells[20], "-");                   // the example tracks carry no true points
     EXPECT_EQ(cells[22], "0");
     EXPECT_EQ(cells[23], "0");
     EXPECT_GT(std::stod(cells[24]), 0.5) << line;  // the mouth opens with the landmarks'
