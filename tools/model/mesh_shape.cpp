@@ -99,6 +99,7 @@ double FoldMeter::SharpestEdge(const Points& points) const {
 
 std::size_t CountCuts(const Points& points, const std::vector<Triangle>& triangles) {
   std::vector<Box> boxes;
+  boxes.reserve(triangles.size());
   for (const Triangle& t : triangles) {
     boxes.push_back(BoxOf({points[t[0]], points[t[1]], points[t[2]]}));
   }
