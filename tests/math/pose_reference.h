@@ -11,6 +11,7 @@
 #include <cstdlib>
 #include <vector>
 
+#include "math/pose_scene.h"
 #include "norvale_3d_sticker_core.h"
 
 namespace n3ds::testing {
@@ -26,6 +27,15 @@ struct PoseCase {
 
   int count() const { return static_cast<int>(landmarks.size() / 2); }
 };
+
+// A head whose landmarks lie exactly where `pose` puts them.
+inline PoseCase ExactCase(const Pose& pose) {
+  PoseCase c;
+  c.model = MakeHead();
+  c.camera = MakeCamera(1280, 720);
+  c.landmarks = Project(c.model, c.camera, pose);
+  return c;
+}
 
 // What the outline rule did with a landmark.
 enum class OutlineRule { kNotOutline, kKept, kVertical, kHorizontal, kOblique };

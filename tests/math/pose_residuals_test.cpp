@@ -67,14 +67,6 @@ PoseCase RandomCase(std::mt19937& random, const Pose& pose, Line line, float err
   return c;
 }
 
-PoseCase PlainCase(const Pose& pose) {
-  PoseCase c;
-  c.model = MakeHead();
-  c.camera = MakeCamera(1280, 720);
-  c.landmarks = Project(c.model, c.camera, pose);
-  return c;
-}
-
 // What landmark i's residuals and derivatives are multiplied by, measured against a landmark of the
 // same place and no weight at all. Observed 3 and 2 pixels off, so that there is a residual.
 float FactorOf(int i, PoseCase c, const Pose& pose) {
@@ -191,7 +183,7 @@ TEST(ComputeJacobianEtcTest, ExactFitHasNoResidualAndNoGradient) {
 }
 
 TEST(ComputeJacobianEtcTest, QuaternionLengthScalesTheModel) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   Pose doubled = kFrontal;
   for (int i = 0; i < 4; ++i) doubled[i] *= 2;
   for (int i = 4; i < 7; ++i) doubled[i] *= 4;
@@ -201,7 +193,7 @@ TEST(ComputeJacobianEtcTest, QuaternionLengthScalesTheModel) {
 // --- Weights by landmark ---------------------------------------------------------------------
 
 TEST(PoseWeightsTest, WithTheModeOffOnlyTheRangeRuleApplies) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.inner_weight = 0.25f;
   c.range_weight = 0.5f;
   for (int i = 0; i < kHeadPoints; ++i) {
@@ -212,7 +204,7 @@ TEST(PoseWeightsTest, WithTheModeOffOnlyTheRangeRuleApplies) {
 }
 
 TEST(PoseWeightsTest, WithTheModeOnEachLandmarkHasItsFactor) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   for (const int64_t mode : {int64_t{1}, int64_t{-1}, int64_t{1} << 40}) {
     for (const float inner : {0.25f, 4.0f}) {
       c.mode = mode;
@@ -229,21 +221,21 @@ TEST(PoseWeightsTest, WithTheModeOnEachLandmarkHasItsFactor) {
 }
 
 TEST(PoseWeightsTest, LandmarkTwentyCountsATenthOnlyWithTheMode) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   EXPECT_EQ(FactorOf(20, c, kFrontal), 1.0f);
   c.mode = 1;
   EXPECT_NEAR(FactorOf(20, c, kFrontal), 0.1f, 1e-6);
 }
 
 TEST(PoseWeightsTest, InnerWeightOfOneLeavesTheNoseUnscaled) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.mode = 1;
   c.inner_weight = 1;
   for (const int i : {63, 64, 65, 68, 69, 72, 73, 74}) EXPECT_EQ(FactorOf(i, c, kFrontal), 1.0f);
 }
 
 TEST(PoseWeightsTest, ModeAndRangeMultiply) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.mode = 1;
   c.range_weight = 0.5f;
   EXPECT_NEAR(FactorOf(90, c, kFrontal), 0.05f, 1e-6);
@@ -251,7 +243,7 @@ TEST(PoseWeightsTest, ModeAndRangeMultiply) {
 
 TEST(PoseWeightsTest, NumbersCountFromTheFirstPointPassed) {
   // A fit without the 19 outline points: what is passed at 39 has the factor of an eye corner.
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.landmarks.erase(c.landmarks.begin(), c.landmarks.begin() + 2 * 19);
   c.model.erase(c.model.begin(), c.model.begin() + 3 * 19);
   c.mode = 1;
@@ -260,7 +252,7 @@ TEST(PoseWeightsTest, NumbersCountFromTheFirstPointPassed) {
 }
 
 TEST(PoseWeightsTest, LandmarksBeyondTheLastAreOrdinary) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   for (int i = 0; i < 10; ++i) {
     for (int k = 0; k < 3; ++k) c.model.push_back(c.model[3 * 50 + k]);
     for (int k = 0; k < 2; ++k) c.landmarks.push_back(c.landmarks[2 * 50 + k]);
@@ -280,7 +272,7 @@ struct OutlineProbe {
   float r[2], j[2][7], plain_r[2], plain_j[2][7];
 
   OutlineProbe(float outward, float down, Line line) {
-    c = PlainCase(kFrontal);
+    c = ExactCase(kFrontal);
     const ReferenceLine now = ReferenceMiddleLine(c);
     if (line == Line::kVertical) c.landmarks[2 * 9] = static_cast<float>(now.bx) + 0.5f;
     if (line == Line::kHorizontal) c.landmarks[2 * 9 + 1] = static_cast<float>(now.by) + 0.5f;
@@ -351,7 +343,7 @@ TEST(OutlineRuleTest, ObliqueLineProjectsOntoItsNormal) {
 }
 
 TEST(OutlineRuleTest, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.landmarks[2 * 9] = static_cast<float>(ReferenceMiddleLine(c).bx);
   // Every landmark observed nearer the middle line, a vertical one, than it projects.
   const float middle = c.landmarks[2 * 9];
@@ -371,7 +363,7 @@ TEST(OutlineRuleTest, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
 TEST(OutlineRuleTest, LineHangsOnTruncatedObservationsAndMixedEyeCornerCoordinates) {
   // B is (trunc(x51 + x45) / 2, trunc(x51 + y45 + 1) / 2): the line is vertical when the chin's
   // truncated x equals the first, whatever the fraction.
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.landmarks[2 * 45] = 600.75f;
   c.landmarks[2 * 45 + 1] = 300.0f;
   c.landmarks[2 * 51] = 680.5f;  // sum 1281.25: B.x = 640; B.y = trunc(981.5) / 2 = 490
@@ -399,7 +391,7 @@ TEST(OutlineRuleTest, LineHangsOnTruncatedObservationsAndMixedEyeCornerCoordinat
 
 TEST(OutlineRuleTest, WithoutTheEyeCornersThereIsNoLine) {
   // 51 points do not reach landmark 51; nothing beyond the array may be read.
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   c.landmarks.resize(2 * 51);
   c.model.resize(3 * 51);
   c.landmarks[0] += 6;
@@ -412,7 +404,7 @@ TEST(OutlineRuleTest, LandmarksBeyondTheRangeOfIntegersAreHarmless) {
   constexpr float kHuge = 3e38f;
   const float values[] = {kHuge,         -kHuge,        std::numeric_limits<float>::infinity(),
                           std::nanf(""), 2147483648.0f, -2147483648.0f};
-  PoseCase c = PlainCase(kFrontal);
+  PoseCase c = ExactCase(kFrontal);
   for (const float a : values) {
     for (const float b : values) {
       c.landmarks[2 * 9] = a;
@@ -557,7 +549,7 @@ TEST(ComputeJacobianEtcTest, ColumnsBeyondTheSeventhAreOnlyWeighted) {
 }
 
 TEST(ComputeJacobianEtcTest, TransposeThatCannotBeHadIsReported) {
-  const PoseCase c = PlainCase(kFrontal);
+  const PoseCase c = ExactCase(kFrontal);
   const size_t needed = 7 * 190 * sizeof(float) + 32;
   const Pool small(needed - 8), enough(needed);
   const Evaluation e = Evaluate(c, kFrontal, 7, small.handle());

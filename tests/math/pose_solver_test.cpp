@@ -26,14 +26,6 @@ PoseSolverSummary SolveWithSummary(const PoseCase& c, Pose* pose) {
   return summary;
 }
 
-PoseCase Picture(const Pose& truth) {
-  PoseCase c;
-  c.model = MakeHead();
-  c.camera = MakeCamera(1280, 720);
-  c.landmarks = Project(c.model, c.camera, truth);
-  return c;
-}
-
 // A start as far away as a head moves between two frames.
 Pose Near(std::mt19937& random, const Pose& truth, float angle, float shift) {
   const Pose turn = RandomPose(random, {angle, angle, angle, 0, 0, 0, 0});
@@ -61,7 +53,7 @@ TEST(SolveByLMTest, RecoversEveryKnownPoseWithoutTheOutlineRule) {
   auto random = MakeRandom();
   for (int run = 0; run < 400; ++run) {
     const Pose truth = RandomPose(random);
-    PoseCase c = Picture(truth);
+    PoseCase c = ExactCase(truth);
     // Up to landmark 50: too few for a middle line.
     c.landmarks.resize(2 * 51);
     c.model.resize(3 * 51);
@@ -81,7 +73,7 @@ TEST(SolveByLMTest, RecoversNearlyEveryKnownPoseWithTheOutlineRule) {
   int near = 0, start = 0;
   for (int run = 0; run < 400; ++run) {
     const Pose truth = RandomPose(random, {0.3f, 0.4f, 0.2f, 60, 40, 600, 1000});
-    const PoseCase c = Picture(truth);
+    const PoseCase c = ExactCase(truth);
     Pose pose = Near(random, truth, 8 * kDegree, 20);
     ASSERT_EQ(Solve(c, &pose), N3DS_OK);
     near += AngleBetween(Normalised(pose), truth) < 0.15f * kDegree ? 1 : 0;
@@ -100,7 +92,7 @@ TEST(SolveByLMTest, NoiseMovesThePoseByLittle) {
     std::vector<double> angles;
     for (int run = 0; run < 200; ++run) {
       const Pose truth = RandomPose(random);
-      PoseCase c = Picture(truth);
+      PoseCase c = ExactCase(truth);
       c.mode = mode;
       for (float& v : c.landmarks) v = std::floor(v + 0.5f * Normal(random) + 0.5f);
       Pose pose = Near(random, truth, 6 * kDegree, 15);
@@ -140,7 +132,7 @@ TEST(SolveByLMTest, EveryPassEqualsThePlainLoopBitForBit) {
   int rejected = 0, flips_that_matter = 0;
   for (int run = 0; run < 600; ++run) {
     const Pose truth = RandomPose(random);
-    PoseCase c = Picture(truth);
+    PoseCase c = ExactCase(truth);
     const float error = run % 4 == 0 ? 0.0f : Uniform(random, 0, 20);
     for (float& v : c.landmarks) v += Uniform(random, -error, error);
     c.contour_weight = Uniform(random, 0.2f, 2.0f);
@@ -202,7 +194,7 @@ struct RejectedStep {
     auto random = MakeRandom();
     for (int run = 0; run < 10000; ++run) {
       const Pose truth = RandomPose(random);
-      c = Picture(truth);
+      c = ExactCase(truth);
       start = Near(random, truth, 50 * kDegree, 150);
       expected = ReferenceSolvePose(c, start);
       if (expected.status != N3DS_OK || expected.rejected_before_accepted == 0) continue;
@@ -241,7 +233,7 @@ TEST(SolveByLMTest, IterationLimitReturnsZeroAndTheLastAcceptedPose) {
   int limits = 0;
   for (int run = 0; run < 50; ++run) {
     const Pose truth = RandomPose(random);
-    PoseCase c = Picture(truth);
+    PoseCase c = ExactCase(truth);
     for (float& v : c.landmarks) v += Uniform(random, -150, 150);
     const Pose start = Near(random, truth, 30 * kDegree, 100);
     Pose pose = start;
@@ -262,7 +254,7 @@ TEST(SolveByLMTest, AcceptedStepsNeverRaiseTheError) {
   auto random = MakeRandom();
   for (int run = 0; run < 100; ++run) {
     const Pose truth = RandomPose(random);
-    PoseCase c = Picture(truth);
+    PoseCase c = ExactCase(truth);
     // Without a middle line nothing is weighted, so this error is what the solver minimises.
     c.landmarks.resize(2 * 51);
     c.model.resize(3 * 51);
@@ -275,7 +267,7 @@ TEST(SolveByLMTest, AcceptedStepsNeverRaiseTheError) {
 }
 
 TEST(SolveByLMTest, PointAtZeroDepthFailsPrintsAndLeavesThePose) {
-  PoseCase c = Picture(MakePose(0, 0, 0, 0, 0, 600));
+  PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
   const Pose start = {1, 0, 0, 0, 0, 0, -c.model[3 * 20 + 2]};  // landmark 20 on the camera plane
   Pose pose = start;
   MRESULT status = N3DS_OK;
@@ -289,7 +281,7 @@ TEST(SolveByLMTest, ZeroDepthOnTheWayKeepsTheLastAcceptedPose) {
   // so that they do not keep the solve from coming there.
   auto random = MakeRandom();
   const Pose truth = {1, 0, 0, 0, 0, 0, 512};
-  PoseCase c = Picture(truth);
+  PoseCase c = ExactCase(truth);
   c.range_weight = 0;
   for (int i = 5; i < kHeadPoints; ++i) {
     if (i > 13 && i < 80 && i != 75 && i != 76) continue;
@@ -341,7 +333,7 @@ TEST(SolveByLMTest, SingularSystemFailsPrintsAndLeavesThePose) {
 }
 
 TEST(SolveByLMTest, PoseThatIsNotANumberEndsWithoutHarm) {
-  const PoseCase c = Picture(MakePose(0, 0, 0, 0, 0, 600));
+  const PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
   Pose pose = {std::nanf(""), 0, 0, 0, 0, 0, 600};
   EXPECT_EQ(Solve(c, &pose), N3DS_OK);
   EXPECT_TRUE(std::isnan(pose[0]));
@@ -349,7 +341,7 @@ TEST(SolveByLMTest, PoseThatIsNotANumberEndsWithoutHarm) {
 }
 
 TEST(SolveByLMTest, NullPointersComeBeforeSizes) {
-  const PoseCase c = Picture(MakePose(0, 0, 0, 0, 0, 600));
+  const PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
   Pose pose = MakePose(0, 0, 0, 0, 0, 600);
   const Pose before = pose;
   for (const int32_t count : {95, -1}) {
@@ -374,7 +366,7 @@ TEST(SolveByLMTest, NullPointersComeBeforeSizes) {
 }
 
 TEST(SolveByLMTest, NoPointsOrNoParametersAreFoundAtOnce) {
-  const PoseCase c = Picture(MakePose(0, 0, 0, 0, 0, 600));
+  const PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
   const Pose start = MakePose(0.1f, 0, 0, 0, 0, 700);
   Pose pose = start;
   EXPECT_EQ(SolveByLM(nullptr, c.landmarks.data(), c.model.data(), 0, c.camera.data(), pose.data(),
@@ -390,7 +382,7 @@ TEST(SolveByLMTest, NoPointsOrNoParametersAreFoundAtOnce) {
 TEST(SolveByLMTest, FewerParametersHoldTheOthersFixed) {
   auto random = MakeRandom();
   const Pose truth = RandomPose(random);
-  const PoseCase c = Picture(truth);
+  const PoseCase c = ExactCase(truth);
   Pose pose = Near(random, truth, 8 * kDegree, 0);
   // The rotation alone, about the true translation.
   ASSERT_EQ(SolveByLM(nullptr, c.landmarks.data(), c.model.data(), 95, c.camera.data(), pose.data(),
@@ -403,7 +395,7 @@ TEST(SolveByLMTest, FewerParametersHoldTheOthersFixed) {
 TEST(SolveByLMTest, ParametersBeyondTheSeventhStayAsTheyAre) {
   auto random = MakeRandom();
   const Pose truth = RandomPose(random);
-  const PoseCase c = Picture(truth);
+  const PoseCase c = ExactCase(truth);
   const Pose start = Near(random, truth, 8 * kDegree, 10);
   std::vector<float> longer(start.begin(), start.end());
   longer.insert(longer.end(), {1.5f, -2.5f});
@@ -420,7 +412,7 @@ TEST(SolveByLMTest, ParametersBeyondTheSeventhStayAsTheyAre) {
 TEST(SolveByLMTest, EveryFailedAllocationIsReportedAndReleasesTheRest) {
   auto random = MakeRandom();
   const Pose truth = RandomPose(random);
-  PoseCase c = Picture(truth);
+  PoseCase c = ExactCase(truth);
   c.landmarks.resize(2 * 12);
   c.model.resize(3 * 12);
   const Pose start = Near(random, truth, 3 * kDegree, 10);
@@ -457,7 +449,7 @@ TEST(SolveByLMTest, PoolAndSystemHeapGiveTheSameBits) {
   auto random = MakeRandom();
   for (int run = 0; run < 20; ++run) {
     const Pose truth = RandomPose(random);
-    const PoseCase c = Picture(truth);
+    const PoseCase c = ExactCase(truth);
     const Pose start = Near(random, truth, 10 * kDegree, 20);
     Pose heap = start, pooled = start;
     const Pool pool(1 << 15);
@@ -473,7 +465,7 @@ TEST(SolveByLMTest, PosesAreTheSameBitsOnEveryMachine) {
   uint32_t hash = 2166136261u;
   for (int run = 0; run < 200; ++run) {
     const Pose truth = RandomPose(random);
-    PoseCase c = Picture(truth);
+    PoseCase c = ExactCase(truth);
     for (float& v : c.landmarks) v = std::floor(v + Normal(random) + 0.5f);
     c.mode = run % 2;
     c.range_weight = Uniform(random, 0.1f, 1.0f);
