@@ -25,10 +25,6 @@ Vector3 Midway(const Vector3& a, const Vector3& b) {
   return {(a[0] + b[0]) / 2, (a[1] + b[1]) / 2, (a[2] + b[2]) / 2};
 }
 
-double Distance(const Vector3& a, const Vector3& b) {
-  return Norm({a[0] - b[0], a[1] - b[1], a[2] - b[2]});
-}
-
 Attached PointsOf(const Vector3& bridge, double size) {
   const auto scaled = [size](const Vector3& p) {
     return Vector3{size * p[0], size * p[1], size * p[2]};
@@ -45,7 +41,7 @@ double Spread(const std::vector<Vector3>& landmarks) {
   }
   double squares = 0;
   for (std::size_t k = kSizeFirst; k <= kSizeLast; ++k) {
-    const double distance = Distance(landmarks[k], middle);
+    const double distance = Length(landmarks[k] - middle);
     squares += distance * distance;
   }
   return std::sqrt(squares / kCount);
@@ -86,8 +82,8 @@ std::map<std::int64_t, Person> MeasurePeople(const Track& track, const std::vect
     }
     const Vector3 bridge = Midway(sum.landmarks[kBridgeUpper], sum.landmarks[kBridgeLower]);
     const double size = Spread(sum.landmarks) / Spread(mean);
-    people[id] = {PointsOf(bridge, size),
-                  Distance(sum.landmarks[kPupil], sum.landmarks[kPupil + 1]), 2 * size * kEar[0]};
+    people[id] = {PointsOf(bridge, size), Length(sum.landmarks[kPupil] - sum.landmarks[kPupil + 1]),
+                  2 * size * kEar[0]};
   }
   return people;
 }

@@ -9,7 +9,7 @@
 #include <limits>
 
 #include "engine/engine_session.h"
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 #include "support/statistics.h"
 
 namespace n3ds::tool {
@@ -30,17 +30,19 @@ class MeshMetrics : public ::testing::Test {
     header_.height = 960;
     header_.fps = 30;
     header_.landmarks = 101;
-    for (const std::int16_t value : model_.mean) mean_.push_back(value / 256.0F);
+    for (std::size_t i = 0; i < model_.mean.size(); i += 3) {
+      const std::int16_t* p = &model_.mean[i];
+      mean_.push_back({p[0] / 256.0, p[1] / 256.0, p[2] / 256.0});
+    }
     SetMesh(mean_);
     Turn(0);
   }
 
-  void SetMesh(const std::vector<float>& vertices) {
+  void SetMesh(const Points& vertices) {
     face_.corners.clear();
-    for (const auto& triangle : MeshTriangles()) {
-      for (const std::uint16_t v : triangle) {
-        const auto at = vertices.begin() + 3 * std::ptrdiff_t{v};
-        face_.corners.insert(face_.corners.end(), at, at + 3);
+    for (const Triangle& triangle : FaceTriangles()) {
+      for (const std::size_t v : triangle) {
+        for (const double x : vertices[v]) face_.corners.push_back(static_cast<float>(x));
       }
     }
   }
@@ -63,8 +65,7 @@ class MeshMetrics : public ::testing::Test {
   }
 
   PixelPoint Drawn(std::size_t landmark) const {
-    const std::vector<float> vertices = VerticesOfCorners(face_.corners);
-    const float* v = &vertices[3 * LandmarkVertex(landmark)];
+    const Vector3 v = VerticesOfCorners(face_.corners)[LandmarkVertices()[landmark]];
     return ProjectToPicture(face_, header_, v[0], v[1], v[2]);
   }
 
@@ -95,7 +96,7 @@ class MeshMetrics : public ::testing::Test {
   FaceModelFile model_;
   MeshJudge judge_;
   TrackHeader header_;
-  std::vector<float> mean_;
+  Points mean_;
   FaceResult face_;
   TrackFace seen_;
 };
@@ -173,31 +174,31 @@ TEST_F(MeshMetrics, TheMeanFaceIsNotFolded) { EXPECT_FALSE(judge_.IsFolded(mean_
 
 // The inner end of a brow is pulled 40 mm to the side, over its neighbours.
 TEST_F(MeshMetrics, AVertexPulledAcrossItsNeighboursFolds) {
-  std::vector<float> vertices = mean_;
-  vertices[3 * LandmarkVertex(24)] -= 40;
+  Points vertices = mean_;
+  vertices[LandmarkVertices()[24]][0] -= 40;
   EXPECT_TRUE(judge_.IsFolded(vertices));
 }
 
 // Neighbours agree with each other in a face that is inside out; the mean face tells.
 TEST_F(MeshMetrics, AFaceInsideOutIsFolded) {
-  std::vector<float> vertices = mean_;
-  for (std::size_t i = 0; i < vertices.size(); i += 3) vertices[i] = -vertices[i];
+  Points vertices = mean_;
+  for (Vector3& p : vertices) p[0] = -p[0];
   EXPECT_TRUE(judge_.IsFolded(vertices));
 }
 
 TEST_F(MeshMetrics, TheMouthIsMeasuredInBoth) {
   MeshScore all;
-  for (const float opened : {0.0F, 10.0F, 25.0F}) {
+  for (const double opened : {0.0, 10.0, 25.0}) {
     SetMesh(mean_);
     SeeTheMesh();
     // The landmark of the lower lip moves by `opened` pixels, the mesh follows half of it.
     const PixelPoint closed = Drawn(93);
-    std::vector<float> vertices = mean_;
-    vertices[3 * LandmarkVertex(93) + 1] -= 2;
+    Points vertices = mean_;
+    vertices[LandmarkVertices()[93]][1] -= 2;
     SetMesh(vertices);
     const double pixels_per_mm = (Drawn(93).y - closed.y) / 2;
     vertices = mean_;
-    vertices[3 * LandmarkVertex(93) + 1] -= opened / 2 / static_cast<float>(pixels_per_mm);
+    vertices[LandmarkVertices()[93]][1] -= opened / 2 / pixels_per_mm;
     SetMesh(vertices);
     seen_.points[2 * 93 + 1] += static_cast<std::int32_t>(opened);
     all.Add(Judge());
@@ -221,7 +222,7 @@ TEST(HeadModel, TakesBackThePitchOfTheModelFile) {
   EXPECT_FLOAT_EQ(head[12], 10);
   // The mean face of the file, pitched, is the upright one of the head frame, pitched back.
   const FaceModelFile model = ReadFaceModelFile(DefaultModelPath());
-  const std::vector<Point3> upright = MeanFace(model);
+  const Points upright = MeanFace(model);
   for (std::size_t v = 0; v < upright.size(); v += 100) {
     for (std::size_t k = 0; k < 3; ++k) {
       const double file = model.mean[3 * v + k] / 256.0 + double{face.model[12 + k]};

@@ -154,7 +154,7 @@ TEST(Metrics, OffsetDoesNotFollowAWrongDepth) {
     for (double& value : frame[0].translation) value *= 1.1;
   }
   const HeadFrameOffset offset = EstimateOffset({Judged(track, poses)});
-  EXPECT_NEAR(Norm(offset.origin), 0, 1e-6);
+  EXPECT_NEAR(Length(offset.origin), 0, 1e-6);
   for (const PoseError& error : ScoreTrack(Judged(track, poses), offset).errors) {
     EXPECT_NEAR(error.depth, 10, 1e-6);
     EXPECT_NEAR(error.across, 0, 1e-6);

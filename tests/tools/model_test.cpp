@@ -9,10 +9,10 @@
 #include <string>
 #include <utility>
 
+#include "mesh/face_tables.h"
+#include "mesh/mesh_shape.h"
+#include "mesh/mesh_topology.h"
 #include "model/face_shapes.h"
-#include "model/face_tables.h"
-#include "model/mesh_shape.h"
-#include "model/mesh_topology.h"
 #include "model/model_checks.h"
 #include "model/obj_export.h"
 #include "model/random_people.h"

@@ -9,7 +9,7 @@
 #include <numeric>
 
 #include "engine/engine_session.h"
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 #include "render/contact_sheet.h"
 #include "render/obj_file.h"
 #include "render/picture.h"
@@ -192,8 +192,8 @@ int MaskAlpha(const Picture& mask, std::size_t first, std::size_t last) {
   double u = 0;
   double v = 0;
   for (std::size_t k = first; k <= last; ++k) {
-    u += static_cast<double>(MeshTextureCoordinates()[LandmarkVertex(k)][0]);
-    v += static_cast<double>(MeshTextureCoordinates()[LandmarkVertex(k)][1]);
+    u += FaceTexture()[LandmarkVertices()[k]][0];
+    v += FaceTexture()[LandmarkVertices()[k]][1];
   }
   const double count = static_cast<double>(last - first + 1);
   return mask.Pixel(static_cast<int>(u / count * mask.width),

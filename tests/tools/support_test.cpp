@@ -102,9 +102,9 @@ TEST(ResultsFile, WhatIsNoNumberIsNull) {
 
 TEST(FaceModelFile, ShipsAnUprightFaceOfHumanSize) {
   const FaceModelFile model = ReadFaceModelFile(N3DS_SOURCE_DIR "/data/face_model.bin");
-  Point3 low = {1e9, 1e9, 1e9};
-  Point3 high = {-1e9, -1e9, -1e9};
-  for (const Point3& p : MeanFace(model)) {
+  Vector3 low = {1e9, 1e9, 1e9};
+  Vector3 high = {-1e9, -1e9, -1e9};
+  for (const Vector3& p : MeanFace(model)) {
     for (std::size_t a = 0; a < 3; ++a) {
       low[a] = std::min(low[a], p[a]);
       high[a] = std::max(high[a], p[a]);

@@ -19,12 +19,12 @@ namespace n3ds::tool {
 namespace {
 
 struct Box {
-  Point3 low{std::numeric_limits<double>::max(), std::numeric_limits<double>::max(),
-             std::numeric_limits<double>::max()};
-  Point3 high{std::numeric_limits<double>::lowest(), std::numeric_limits<double>::lowest(),
-              std::numeric_limits<double>::lowest()};
+  Vector3 low{std::numeric_limits<double>::max(), std::numeric_limits<double>::max(),
+              std::numeric_limits<double>::max()};
+  Vector3 high{std::numeric_limits<double>::lowest(), std::numeric_limits<double>::lowest(),
+               std::numeric_limits<double>::lowest()};
 
-  void Add(const Point3& p) {
+  void Add(const Vector3& p) {
     for (std::size_t a = 0; a < 3; ++a) {
       low[a] = std::min(low[a], p[a]);
       high[a] = std::max(high[a], p[a]);
@@ -107,7 +107,7 @@ void RunModelInfo(const std::string& path) {
     pitched.Add({p[0] / 256.0, p[1] / 256.0, p[2] / 256.0});
   }
   Box upright;
-  for (const Point3& p : MeanFace(model)) upright.Add(p);
+  for (const Vector3& p : MeanFace(model)) upright.Add(p);
   const auto identity = LargestMoves(model.identity, kModelIdentities);
   const auto expression = LargestMoves(model.expression, kModelExpressions);
   const auto zero = [](std::int8_t v) { return v == 0; };

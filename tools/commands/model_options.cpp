@@ -5,7 +5,7 @@
 #include <cmath>
 #include <cstdlib>
 
-#include "model/face_tables.h"
+#include "mesh/face_tables.h"
 #include "support/error.h"
 
 namespace n3ds::tool {

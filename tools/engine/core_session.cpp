@@ -11,7 +11,7 @@
 
 #include "engine/face_model_file.h"
 #include "engine/face_results.h"
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 #include "support/error.h"
 #include "tracks/upright.h"
 
@@ -29,47 +29,43 @@ std::vector<char> ReadBytes(const std::string& path) {
   return {std::istreambuf_iterator<char>(in), {}};
 }
 
-using Vector3 = std::array<double, 3>;
-using Triangle = std::array<std::uint16_t, 3>;
+using CoreTriangle = std::array<std::uint16_t, 3>;
 
 // Vertices before the viewer: x right, y up, z towards it, mm.
-std::vector<Vector3> BeforeViewer(const N3DS_3D_MODEL& mesh, const N3DS_RIGID_MATRIX& matrices) {
+Points BeforeViewer(const N3DS_3D_MODEL& mesh, const N3DS_RIGID_MATRIX& matrices) {
   FaceResult face;
   std::copy_n(matrices.viewMatrix, 16, face.view.begin());
   std::copy_n(matrices.modelMatrix, 16, face.model.begin());
   const std::array<double, 16> m = ModelView(face);
-  std::vector<Vector3> seen(kModelVertices);
+  Points seen(kModelVertices);
   for (std::size_t v = 0; v < seen.size(); ++v) {
     const float* p = mesh.vertices + 3 * v;
-    for (std::size_t row = 0; row < 3; ++row) {
-      seen[v][row] = m[row] * double{p[0]} + m[4 + row] * double{p[1]} + m[8 + row] * double{p[2]} +
-                     m[12 + row];
-    }
+    seen[v] = Transformed(m, {p[0], p[1], p[2]});
   }
   return seen;
 }
 
 // Positive for a triangle that turns its outside to the viewer: its corners run counter-clockwise
 // round the line of sight.
-double Facing(const Vector3& a, const Vector3& b, const Vector3& c) {
-  return -(a[0] * (b[1] * c[2] - b[2] * c[1]) + a[1] * (b[2] * c[0] - b[0] * c[2]) +
-           a[2] * (b[0] * c[1] - b[1] * c[0]));
-}
+double Facing(const Vector3& a, const Vector3& b, const Vector3& c) { return -Dot(a, Cross(b, c)); }
 
 // As many triangles as the mesh has, the farthest first; those that look away are shrunk to a
 // point, which draws nothing.
-std::vector<Triangle> VisibleTriangles(const std::vector<Vector3>& seen) {
-  std::vector<std::pair<double, Triangle>> by_depth;
+std::vector<CoreTriangle> VisibleTriangles(const Points& seen) {
+  std::vector<std::pair<double, CoreTriangle>> by_depth;
   by_depth.reserve(kMeshTriangles);
-  for (const Triangle& t : MeshTriangles()) {
+  for (const Triangle& t : FaceTriangles()) {
     const Vector3& a = seen[t[0]];
     const Vector3& b = seen[t[1]];
     const Vector3& c = seen[t[2]];
-    if (Facing(a, b, c) > 0) by_depth.emplace_back(a[2] + b[2] + c[2], t);
+    if (Facing(a, b, c) > 0) {
+      const auto vertex = [&t](std::size_t k) { return static_cast<std::uint16_t>(t[k]); };
+      by_depth.emplace_back(a[2] + b[2] + c[2], CoreTriangle{vertex(0), vertex(1), vertex(2)});
+    }
   }
   std::stable_sort(by_depth.begin(), by_depth.end(),
                    [](const auto& left, const auto& right) { return left.first < right.first; });
-  std::vector<Triangle> triangles(kMeshTriangles, Triangle{});
+  std::vector<CoreTriangle> triangles(kMeshTriangles, CoreTriangle{});
   std::transform(by_depth.begin(), by_depth.end(), triangles.begin(),
                  [](const auto& entry) { return entry.second; });
   return triangles;
@@ -78,9 +74,9 @@ std::vector<Triangle> VisibleTriangles(const std::vector<Vector3>& seen) {
 // The engine's layout as the warp takes a caller's own: v up.
 std::vector<float> UpwardCoordinates() {
   std::vector<float> coordinates;
-  for (const auto& [u, v] : MeshTextureCoordinates()) {
-    coordinates.push_back(u);
-    coordinates.push_back(1 - v);
+  for (const auto& [u, v] : FaceTexture()) {
+    coordinates.push_back(static_cast<float>(u));
+    coordinates.push_back(static_cast<float>(1 - v));
   }
   return coordinates;
 }
@@ -144,9 +140,9 @@ std::vector<std::size_t> CoreSession::FarToNear() const {
 }
 
 void CoreSession::Warp(const NSVL_OFFSCREEN& texture, std::size_t face, NSVL_OFFSCREEN output) {
-  const std::vector<Triangle> triangles =
+  const std::vector<CoreTriangle> triangles =
       VisibleTriangles(BeforeViewer(meshes_[face], matrices_[face]));
-  const std::vector<float> coordinates = UpwardCoordinates();
+  static const std::vector<float> coordinates = UpwardCoordinates();
   N3DS_2D_TEXTURE_MASK mask{};
   mask.texCoords = coordinates.data();
   mask.texCoordCount = static_cast<std::int64_t>(kModelVertices);

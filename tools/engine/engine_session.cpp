@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <memory>
 
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 #include "norvale_3d_sticker_engine.h"
 #include "support/error.h"
 
@@ -107,7 +107,9 @@ FrameResult EngineSession::Process(const TrackFrame& frame) {
       result.faces[i].pitched = true;
       result.faces[i].corners.assign(mesh.vertices, mesh.vertices + 3 * kMeshCorners);
       // The same table for every face and frame.
-      texture_coordinates_.assign(mesh.texCoords, mesh.texCoords + 2 * kMeshCorners);
+      if (texture_coordinates_.empty()) {
+        texture_coordinates_.assign(mesh.texCoords, mesh.texCoords + 2 * kMeshCorners);
+      }
     }
   }
   return result;

@@ -72,17 +72,15 @@ FaceModelFile ReadFaceModelFile(const std::string& path) {
   return model;
 }
 
-Point3 UprightPoint(const std::int16_t* stored) {
-  constexpr double kCosTilt = 0.9397;
-  constexpr double kSinTilt = 0.342;
+Vector3 UprightPoint(const std::int16_t* stored) {
   const double x = stored[0] / 256.0;
   const double y = stored[1] / 256.0;
   const double z = stored[2] / 256.0;
-  return {x, kCosTilt * y - kSinTilt * z, kSinTilt * y + kCosTilt * z};
+  return {x, kTiltCosine * y - kTiltSine * z, kTiltSine * y + kTiltCosine * z};
 }
 
-std::vector<Point3> MeanFace(const FaceModelFile& model) {
-  std::vector<Point3> points(kModelVertices);
+Points MeanFace(const FaceModelFile& model) {
+  Points points(kModelVertices);
   for (std::size_t v = 0; v < kModelVertices; ++v) points[v] = UprightPoint(&model.mean[3 * v]);
   return points;
 }

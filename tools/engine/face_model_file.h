@@ -2,11 +2,12 @@
 // from. The engine reads the file on its own.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <string>
 #include <vector>
+
+#include "support/vector3.h"
 
 namespace n3ds::tool {
 
@@ -25,13 +26,14 @@ struct FaceModelFile {
 // Reads a file of the format; throws Error with what is wrong with size or header.
 FaceModelFile ReadFaceModelFile(const std::string& path);
 
-using Point3 = std::array<double, 3>;
+// The pitch of the file's shape, 20 degrees, as the engine takes it back.
+constexpr double kTiltCosine = 0.9397;
+constexpr double kTiltSine = 0.342;
 
-// A coordinate triple of the file in the frame of the engine's model matrix, mm: the file's shape
-// is pitched by 20 degrees, which the engine's output takes back.
-Point3 UprightPoint(const std::int16_t* stored);
+// A coordinate triple of the file in the frame of the engine's model matrix, mm.
+Vector3 UprightPoint(const std::int16_t* stored);
 
 // The mean face in the frame of the engine's model matrix, mm.
-std::vector<Point3> MeanFace(const FaceModelFile& model);
+Points MeanFace(const FaceModelFile& model);
 
 }  // namespace n3ds::tool

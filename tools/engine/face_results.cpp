@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "engine/face_model_file.h"
+
 namespace n3ds::tool {
 namespace {
 
@@ -22,11 +24,10 @@ std::array<double, 16> Multiplied(const Matrix4& a, const Matrix4& b) {
 
 Matrix4 HeadModel(const FaceResult& face) {
   if (!face.pitched) return face.model;
-  constexpr float kCosTilt = 0.9397F;
-  constexpr float kSinTilt = 0.342F;
+  constexpr auto kCosine = static_cast<float>(kTiltCosine);
+  constexpr auto kSine = static_cast<float>(kTiltSine);
   // Column by column, so the rows of this text are the head's axes.
-  constexpr Matrix4 kPitch = {1, 0,        0,        0, 0, kCosTilt, -kSinTilt, 0,
-                              0, kSinTilt, kCosTilt, 0, 0, 0,        0,         1};
+  constexpr Matrix4 kPitch = {1, 0, 0, 0, 0, kCosine, -kSine, 0, 0, kSine, kCosine, 0, 0, 0, 0, 1};
   const std::array<double, 16> product = Multiplied(face.model, kPitch);
   Matrix4 head{};
   std::transform(product.begin(), product.end(), head.begin(),
@@ -40,6 +41,15 @@ std::array<double, 16> ModelView(const FaceResult& face) {
 
 std::array<double, 16> HeadView(const FaceResult& face) {
   return Multiplied(face.view, HeadModel(face));
+}
+
+Vector3 Transformed(const std::array<double, 16>& matrix, const Vector3& p) {
+  Vector3 result{};
+  for (std::size_t row = 0; row < 3; ++row) {
+    result[row] =
+        matrix[row] * p[0] + matrix[4 + row] * p[1] + matrix[8 + row] * p[2] + matrix[12 + row];
+  }
+  return result;
 }
 
 bool IsFinite(const std::vector<float>& values) {
@@ -56,15 +66,11 @@ bool IsFinite(const FaceResult& face) {
 
 PixelPoint ProjectToPicture(const FaceResult& face, const TrackHeader& header, double x, double y,
                             double z) {
-  const auto model_view = ModelView(face);
-  std::array<double, 4> eye{};
-  for (std::size_t row = 0; row < 4; ++row) {
-    eye[row] = model_view[row] * x + model_view[4 + row] * y + model_view[8 + row] * z +
-               model_view[12 + row];
-  }
+  const Vector3 eye = Transformed(ModelView(face), {x, y, z});
   std::array<double, 4> clip{};
   for (std::size_t row = 0; row < 4; ++row) {
-    for (std::size_t k = 0; k < 4; ++k) clip[row] += double{face.projection[4 * k + row]} * eye[k];
+    for (std::size_t k = 0; k < 3; ++k) clip[row] += double{face.projection[4 * k + row]} * eye[k];
+    clip[row] += double{face.projection[12 + row]};
   }
   return {(clip[0] / clip[3] + 1) / 2 * ViewportSize(header.upright_width()),
           (1 - clip[1] / clip[3]) / 2 * ViewportSize(header.upright_height())};

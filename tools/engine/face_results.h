@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <vector>
 
+#include "support/vector3.h"
 #include "tracks/upright.h"
 
 namespace n3ds::tool {
@@ -38,6 +39,9 @@ Matrix4 HeadModel(const FaceResult& face);
 std::array<double, 16> ModelView(const FaceResult& face);
 // Upright head frame to OpenGL eye space.
 std::array<double, 16> HeadView(const FaceResult& face);
+
+// A point under a matrix without perspective, column-major.
+Vector3 Transformed(const std::array<double, 16>& matrix, const Vector3& p);
 
 // Every number of the matrices, landmarks and mesh is finite.
 bool IsFinite(const FaceResult& face);

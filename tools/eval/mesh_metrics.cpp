@@ -2,10 +2,10 @@
 
 #include <algorithm>
 #include <cmath>
-#include <map>
-#include <utility>
 
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
+#include "mesh/mesh_shape.h"
+#include "mesh/mesh_topology.h"
 #include "tracks/upright.h"
 
 namespace n3ds::tool {
@@ -16,34 +16,7 @@ constexpr std::size_t kInnerLips[2] = {89, 93};  // their middles, upper and low
 
 const double kFoldCosine = std::cos(kFoldDegrees / 57.295779513082320876798);
 
-Vector3 VertexAt(const std::vector<float>& vertices, std::size_t v) {
-  return {vertices[3 * v], vertices[3 * v + 1], vertices[3 * v + 2]};
-}
-
-// Unit normals; zero for a triangle without area, which has no side that could be turned over.
-std::vector<Vector3> Normals(const std::vector<float>& vertices) {
-  std::vector<Vector3> normals;
-  normals.reserve(kMeshTriangles);
-  for (const auto& triangle : MeshTriangles()) {
-    const Vector3 origin = VertexAt(vertices, triangle[0]);
-    Vector3 a = VertexAt(vertices, triangle[1]);
-    Vector3 b = VertexAt(vertices, triangle[2]);
-    for (std::size_t k = 0; k < 3; ++k) {
-      a[k] -= origin[k];
-      b[k] -= origin[k];
-    }
-    Vector3 normal = {a[1] * b[2] - a[2] * b[1], a[2] * b[0] - a[0] * b[2],
-                      a[0] * b[1] - a[1] * b[0]};
-    const double length = Norm(normal);
-    for (double& value : normal) value = length > 0 ? value / length : 0;
-    normals.push_back(normal);
-  }
-  return normals;
-}
-
-bool AreOpposed(const Vector3& a, const Vector3& b) {
-  return a[0] * b[0] + a[1] * b[1] + a[2] * b[2] < kFoldCosine;
-}
+bool AreOpposed(const Vector3& a, const Vector3& b) { return Dot(a, b) < kFoldCosine; }
 
 double Distance(const PixelPoint& a, const PixelPoint& b) {
   return std::hypot(a.x - b.x, a.y - b.y);
@@ -88,22 +61,18 @@ double MeshScore::MouthGain() const {
   return square > 0 ? product / square : 0;
 }
 
-MeshJudge::MeshJudge(const FaceModelFile& model) {
+MeshJudge::MeshJudge(const FaceModelFile& model) : neighbours_(Neighbours(FaceTriangles())) {
   // The size does not matter to normals, so the file's units serve.
-  mean_normals_ = Normals(std::vector<float>(model.mean.begin(), model.mean.end()));
-  std::map<std::pair<std::uint16_t, std::uint16_t>, std::uint16_t> first_at_edge;
-  for (std::uint16_t t = 0; t < kMeshTriangles; ++t) {
-    const auto& corners = MeshTriangles()[t];
-    for (std::size_t k = 0; k < 3; ++k) {
-      const auto edge = std::minmax({corners[k], corners[(k + 1) % 3]});
-      const auto [place, is_new] = first_at_edge.emplace(edge, t);
-      if (!is_new) neighbours_.push_back({place->second, t});
-    }
+  Points mean(kModelVertices);
+  for (std::size_t v = 0; v < mean.size(); ++v) {
+    for (std::size_t k = 0; k < 3; ++k) mean[v][k] = model.mean[3 * v + k];
   }
+  mean_normals_ = MeasureFacets(mean, FaceTriangles()).normals;
 }
 
-bool MeshJudge::IsFolded(const std::vector<float>& vertices) const {
-  const std::vector<Vector3> normals = Normals(vertices);
+// A triangle without area has no side that could be turned over: its normal is zero.
+bool MeshJudge::IsFolded(const Points& vertices) const {
+  const Points normals = MeasureFacets(vertices, FaceTriangles()).normals;
   for (std::size_t t = 0; t < normals.size(); ++t) {
     if (AreOpposed(normals[t], mean_normals_[t])) return true;
   }
@@ -121,7 +90,7 @@ void MeshJudge::AddFrame(const TrackHeader& header, const TrackFrame& frame,
       continue;
     }
     ++score.faces;
-    const std::vector<float> vertices = VerticesOfCorners(face.corners);
+    const Points vertices = VerticesOfCorners(face.corners);
     if (IsFolded(vertices)) ++score.folded;
     const auto& truth = frame.faces[i].truth;
     if (AbsoluteYaw(truth ? truth->rotation : CameraPose(face).rotation) <= kMeshYaw) {
@@ -131,13 +100,13 @@ void MeshJudge::AddFrame(const TrackHeader& header, const TrackFrame& frame,
 }
 
 void MeshJudge::AddDistances(const TrackHeader& header, const TrackFace& face,
-                             const FaceResult& result, const std::vector<float>& vertices,
+                             const FaceResult& result, const Points& vertices,
                              MeshScore& score) const {
   const std::vector<PixelPoint> seen = UprightLandmarks(header, face);
   const double pupils = Distance(seen[kPupils[0]], seen[kPupils[1]]);
   if (pupils == 0) return;
   const auto drawn = [&](std::size_t landmark) {
-    const Vector3 v = VertexAt(vertices, LandmarkVertex(landmark));
+    const Vector3& v = vertices[LandmarkVertices()[landmark]];
     return ProjectToPicture(result, header, v[0], v[1], v[2]);
   };
   const bool is_known = face.truth && !face.truth->points3d.empty() && header.focal;

@@ -1,8 +1,8 @@
 // How well the dense meshes of mask mode fit the landmarks, and whether they are sound.
 #pragma once
 
+#include <array>
 #include <cstddef>
-#include <cstdint>
 #include <vector>
 
 #include "engine/face_model_file.h"
@@ -15,10 +15,6 @@ namespace n3ds::tool {
 // Faces turned further than this are left out of the distances: landmarks of the far side are then
 // a detector's guess.
 constexpr double kMeshYaw = 40;  // degrees, without sign
-
-// Two normals further apart than this are a fold, of a triangle against its neighbour or against
-// its place in the mean face.
-constexpr double kFoldDegrees = 150;
 
 // Lengths are in percent of the distance between the pupils in the same picture.
 struct MeshScore {
@@ -48,15 +44,16 @@ class MeshJudge {
   void AddFrame(const TrackHeader& header, const TrackFrame& frame, const FrameResult& result,
                 MeshScore& score) const;
 
-  // A triangle of the mesh (x, y, z per vertex) is turned over.
-  bool IsFolded(const std::vector<float>& vertices) const;
+  // A triangle of the mesh is turned over against a neighbour or against its place in the mean
+  // face.
+  bool IsFolded(const Points& vertices) const;
 
  private:
   void AddDistances(const TrackHeader& header, const TrackFace& face, const FaceResult& result,
-                    const std::vector<float>& vertices, MeshScore& score) const;
+                    const Points& vertices, MeshScore& score) const;
 
-  std::vector<Vector3> mean_normals_;                     // per triangle, in the model file's frame
-  std::vector<std::array<std::uint16_t, 2>> neighbours_;  // triangles with a common edge
+  Points mean_normals_;                                 // per triangle, in the model file's frame
+  std::vector<std::array<std::size_t, 2>> neighbours_;  // triangles with a common edge
 };
 
 }  // namespace n3ds::tool

@@ -35,12 +35,6 @@ Persons ByPerson(const JudgedTrack& judged) {
   return persons;
 }
 
-Vector3 Difference(const Vector3& a, const Vector3& b) {
-  return {a[0] - b[0], a[1] - b[1], a[2] - b[2]};
-}
-
-double Dot(const Vector3& a, const Vector3& b) { return a[0] * b[0] + a[1] * b[1] + a[2] * b[2]; }
-
 // The track's origin as the estimator places it, with the depth it would have under the true focal
 // length.
 Vector3 EstimatedOrigin(const PoseEstimate& pose, const HeadFrameOffset& offset,
@@ -113,7 +107,7 @@ void CompareNeighbours(const Sample& before, const Sample& now, const HeadFrameO
   const double seconds = now.time - before.time;
   const double turned =
       RotationAngle(Multiplied(Transposed(before.truth->rotation), now.truth->rotation));
-  const double moved = Norm(Difference(now.truth->translation, before.truth->translation));
+  const double moved = Length(now.truth->translation - before.truth->translation);
   if (turned < kRestDegreesPerSecond * seconds && moved < kRestMillimetresPerSecond * seconds) {
     score.rest_rotation.push_back(change);
     score.rest_across.push_back(across);
@@ -147,8 +141,8 @@ void AddLagMoments(const std::vector<Sample>& samples, const HeadFrameOffset& of
     }
   }
   for (std::size_t k = 0; k < errors.size(); ++k) {
-    const Vector3 speed = Difference(speeds[k], mean_speed);
-    score.lag_moment -= Dot(Difference(errors[k], mean_error), speed);
+    const Vector3 speed = speeds[k] - mean_speed;
+    score.lag_moment -= Dot(errors[k] - mean_error, speed);
     score.turning_moment += Dot(speed, speed);
   }
 }

@@ -40,10 +40,8 @@ Vector3 Multiplied(const Matrix3& m, const Vector3& v) {
           m[6] * v[0] + m[7] * v[1] + m[8] * v[2]};
 }
 
-double Norm(const Vector3& v) { return std::sqrt(v[0] * v[0] + v[1] * v[1] + v[2] * v[2]); }
-
 Matrix3 RotationAbout(const Vector3& axis, double degrees) {
-  const double n = Norm(axis);
+  const double n = Length(axis);
   const double x = axis[0] / n;
   const double y = axis[1] / n;
   const double z = axis[2] / n;
@@ -58,14 +56,14 @@ Vector3 RotationVector(const Matrix3& r) {
   // Sine from the skew part, cosine from the trace: the pair keeps small angles exact, where the
   // arc cosine alone would lose half the digits.
   Vector3 v = {r[7] - r[5], r[2] - r[6], r[3] - r[1]};
-  const double twice_sine = Norm(v);
+  const double twice_sine = Length(v);
   const double angle = std::atan2(twice_sine, r[0] + r[4] + r[8] - 1) * kDegreesPerRadian;
   if (twice_sine == 0) return {angle, 0, 0};  // 0, or half a turn whose axis is not needed here
   for (double& value : v) value *= angle / twice_sine;
   return v;
 }
 
-double RotationAngle(const Matrix3& rotation) { return Norm(RotationVector(rotation)); }
+double RotationAngle(const Matrix3& rotation) { return Length(RotationVector(rotation)); }
 
 Matrix3 MeanRotation(const std::vector<Matrix3>& rotations) {
   Matrix3 mean{};

@@ -4,15 +4,15 @@
 #include <array>
 #include <vector>
 
+#include "support/vector3.h"
+
 namespace n3ds::tool {
 
-using Vector3 = std::array<double, 3>;
 using Matrix3 = std::array<double, 9>;
 
 Matrix3 Transposed(const Matrix3& m);
 Matrix3 Multiplied(const Matrix3& a, const Matrix3& b);
 Vector3 Multiplied(const Matrix3& m, const Vector3& v);
-double Norm(const Vector3& v);
 
 // Rotation by `degrees` about an axis of any length but 0.
 Matrix3 RotationAbout(const Vector3& axis, double degrees);

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cstdint>
 
-#include "model/vector3.h"
+#include "support/vector3.h"
 
 namespace n3ds::tool {
 namespace {

@@ -9,8 +9,6 @@
 
 namespace n3ds::tool {
 
-using Points = std::vector<Point3>;
-
 // Standard deviations of the population in one unit of an identity coefficient, in the shipped
 // model. The file does not say it.
 constexpr double kIdentityUnit = 8;

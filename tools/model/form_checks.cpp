@@ -5,8 +5,8 @@
 #include <string>
 
 #include "eval/text_table.h"
-#include "model/face_tables.h"
-#include "model/mesh_topology.h"
+#include "mesh/face_tables.h"
+#include "mesh/mesh_topology.h"
 #include "model/model_checks.h"
 
 namespace n3ds::tool {

@@ -2,19 +2,16 @@
 #include <string>
 
 #include "eval/text_table.h"
+#include "mesh/face_tables.h"
+#include "mesh/mesh_shape.h"
 #include "model/face_shapes.h"
-#include "model/face_tables.h"
-#include "model/mesh_shape.h"
 #include "model/model_checks.h"
 #include "model/random_people.h"
-#include "model/vector3.h"
+#include "support/vector3.h"
 
 namespace n3ds::tool {
 namespace {
 
-// Angle between neighbouring normals beyond which skin is folded over. Lips that roll in come to
-// 130 degrees.
-constexpr double kFold = 150;
 constexpr double kSliver = 15;         // degrees, smallest angle that nearly all triangles exceed
 constexpr double kSliverShare = 99;    // percent, what nearly all means
 constexpr double kSmallestAngle = 5;   // degrees, for every triangle
@@ -61,7 +58,8 @@ void CheckMean(const FaceShapes& shapes, const FoldMeter& folds, CheckReport& re
   const double least_area = *std::min_element(facets.areas.begin(), facets.areas.end());
   report.Check("smallest triangle of the mean, mm2", Decimal(least_area, 2),
                least_area > kSmallestArea, "> 0.3");
-  report.Below("sharpest edge of the mean, degrees", folds.SharpestEdge(shapes.mean()), 0, kFold);
+  report.Below("sharpest edge of the mean, degrees", folds.SharpestEdge(shapes.mean()), 0,
+               kFoldDegrees);
   report.Equal("edges that cut through the face at rest, lips too",
                CountCuts(shapes.mean(), FaceTriangles()), 0);
 }
@@ -81,14 +79,14 @@ void CheckNeutralPeople(const FaceShapes& shapes, const FoldMeter& folds, CheckR
       if (Dot(facets.normals[t], rest.normals[t]) < 0) ++turned;
     }
   }
-  report.Below("sharpest edge over 1,000 random people", sharpest, 0, kFold);
+  report.Below("sharpest edge over 1,000 random people", sharpest, 0, kFoldDegrees);
   report.Equal("triangles turned over in them", turned, 0);
 }
 
 void CheckExpressions(const FaceShapes& shapes, const FoldMeter& folds, CheckReport& report) {
   const auto check = [&](const std::string& title, const FaceCoefficients& coefficients) {
     report.Below("sharpest edge with " + title, folds.SharpestEdge(shapes.Compose(coefficients)), 0,
-                 kFold);
+                 kFoldDegrees);
   };
   for (const std::string& name : ExpressionNames()) {
     check(name, Expressed({name.c_str()}, 1));
@@ -107,9 +105,9 @@ void CheckExpressivePeople(const FaceShapes& shapes, const FoldMeter& folds, Che
   for (std::size_t n = 0; n < kRandomPeople; ++n) {
     FaceCoefficients person = usual[n % usual.size()];
     person.identity = people.Identity();
-    if (folds.SharpestEdge(shapes.Compose(person)) >= kFold) ++folded;
+    if (folds.SharpestEdge(shapes.Compose(person)) >= kFoldDegrees) ++folded;
     person.expression = people.Expressions(kMixedShare);
-    if (folds.SharpestEdge(shapes.Compose(person)) >= kFold) ++folded_mixed;
+    if (folds.SharpestEdge(shapes.Compose(person)) >= kFoldDegrees) ++folded_mixed;
   }
   report.Equal("folded faces of 1,000 people with each of these in turn", folded, 0);
   report.Check("folded faces of 1,000 people with random mixtures", std::to_string(folded_mixed),

@@ -5,7 +5,7 @@
 #include <set>
 #include <string>
 
-#include "model/face_tables.h"
+#include "mesh/face_tables.h"
 #include "model/model_checks.h"
 
 namespace n3ds::tool {

@@ -6,12 +6,12 @@
 #include <string>
 
 #include "eval/text_table.h"
+#include "mesh/face_tables.h"
+#include "mesh/mesh_topology.h"
 #include "model/face_shapes.h"
-#include "model/face_tables.h"
-#include "model/mesh_topology.h"
 #include "model/model_checks.h"
-#include "model/vector3.h"
 #include "support/statistics.h"
+#include "support/vector3.h"
 
 namespace n3ds::tool {
 namespace {
@@ -62,8 +62,8 @@ constexpr Stretch kTorn = {std::numeric_limits<double>::infinity(), 0};
 // How much the layout enlarges a triangle along its two principal directions: singular values of
 // the map from the triangle's own plane to the texture.
 Stretch StretchOf(const Triangle& t, const Points& points) {
-  const Point3 ab = points[t[1]] - points[t[0]];
-  const Point3 ac = points[t[2]] - points[t[0]];
+  const Vector3 ab = points[t[1]] - points[t[0]];
+  const Vector3 ac = points[t[2]] - points[t[0]];
   const double base = Length(ab);
   if (base == 0) return kTorn;
   const double along = Dot(ab, ac) / base;

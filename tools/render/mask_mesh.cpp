@@ -1,27 +1,18 @@
 #include "render/mask_mesh.h"
 
-#include <algorithm>
 #include <cstddef>
 
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 #include "render/gpu_mesh.h"
 #include "render/mesh.h"
+#include "render/shapes.h"
 
 namespace n3ds::tool {
 namespace {
 
 // Corners with the normals of the vertices they belong to, so that light runs smoothly over edges.
 std::vector<Vertex> CornersWithNormals(const std::vector<float>& corners) {
-  const std::vector<float> positions = VerticesOfCorners(corners);
-  Mesh mesh;
-  mesh.vertices.resize(positions.size() / 3);
-  for (std::size_t v = 0; v < mesh.vertices.size(); ++v) {
-    std::copy_n(&positions[3 * v], 3, mesh.vertices[v].position.begin());
-  }
-  for (const auto& triangle : MeshTriangles()) {
-    mesh.indices.insert(mesh.indices.end(), triangle.begin(), triangle.end());
-  }
-  ComputeNormals(mesh);
+  const Mesh mesh = FaceMesh(VerticesOfCorners(corners));
   std::vector<Vertex> result;
   result.reserve(mesh.indices.size());
   for (const std::uint32_t index : mesh.indices) result.push_back(mesh.vertices[index]);

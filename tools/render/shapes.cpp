@@ -2,7 +2,7 @@
 
 #include <cmath>
 
-#include "engine/mesh_tables.h"
+#include "mesh/face_tables.h"
 
 namespace n3ds::tool {
 namespace {
@@ -82,14 +82,14 @@ Mesh Arrow(const std::array<float, 3>& start, std::size_t axis, const Material& 
 
 }  // namespace
 
-Mesh FaceMesh(const std::vector<Point3>& points) {
+Mesh FaceMesh(const Points& points) {
   Mesh mesh;
-  for (const Point3& p : points) {
+  for (const Vector3& p : points) {
     mesh.vertices.push_back(
         {{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2])}, {}});
   }
-  for (const auto& triangle : MeshTriangles()) {
-    mesh.indices.insert(mesh.indices.end(), {triangle[0], triangle[1], triangle[2]});
+  for (const Triangle& triangle : FaceTriangles()) {
+    for (const std::size_t v : triangle) mesh.indices.push_back(static_cast<std::uint32_t>(v));
   }
   ComputeNormals(mesh);
   mesh.parts.push_back({kSkin, 0, mesh.indices.size()});

@@ -9,7 +9,7 @@
 namespace n3ds::tool {
 
 // A face of the model's mesh with its vertices at `points`, 1,812 of them.
-Mesh FaceMesh(const std::vector<Point3>& points);
+Mesh FaceMesh(const Points& points);
 
 // The mean face of the model in the frame of the model matrix.
 Mesh FaceMesh(const FaceModelFile& model);

@@ -97,7 +97,7 @@ double YawOf(int view, int views) {
 
 }  // namespace
 
-Picture DrawTurntable(const std::vector<Point3>& face, int views, int size) {
+Picture DrawTurntable(const Points& face, int views, int size) {
   const EglContext context;
   const RenderTarget target(size, size);
   const GlProgram program(kVertexSource, kFragmentSource);

@@ -7,7 +7,7 @@
 #include <utility>
 #include <vector>
 
-#include "model/face_tables.h"
+#include "mesh/face_tables.h"
 
 namespace n3ds::tool {
 

@@ -5,8 +5,7 @@
 #include <cstddef>
 #include <vector>
 
-#include "model/face_shapes.h"
-#include "model/face_tables.h"
+#include "mesh/face_tables.h"
 
 namespace n3ds::tool {
 
@@ -14,10 +13,14 @@ namespace n3ds::tool {
 std::vector<double> SmallestAngles(const Points& points, const std::vector<Triangle>& triangles);
 
 struct Facets {
-  std::vector<Point3> normals;  // unit length; zero for a triangle without area
-  std::vector<double> areas;    // mm2
+  Points normals;             // unit length; zero for a triangle without area
+  std::vector<double> areas;  // mm2
 };
 Facets MeasureFacets(const Points& points, const std::vector<Triangle>& triangles);
+
+// Angle between normals, in degrees, beyond which skin is folded over. Lips that roll in come to
+// 130.
+constexpr double kFoldDegrees = 150;
 
 // Looks for folds: places where neighbouring triangles' normals point nearly against each other.
 class FoldMeter {

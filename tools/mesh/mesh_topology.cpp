@@ -1,4 +1,4 @@
-#include "model/mesh_topology.h"
+#include "mesh/mesh_topology.h"
 
 #include <algorithm>
 #include <functional>

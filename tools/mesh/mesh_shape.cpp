@@ -1,12 +1,12 @@
-#include "model/mesh_shape.h"
+#include "mesh/mesh_shape.h"
 
 #include <algorithm>
 #include <cmath>
 #include <initializer_list>
 #include <limits>
 
-#include "model/mesh_topology.h"
-#include "model/vector3.h"
+#include "mesh/mesh_topology.h"
+#include "support/vector3.h"
 
 namespace n3ds::tool {
 namespace {
@@ -14,13 +14,13 @@ namespace {
 constexpr double kDegrees = 57.29577951308232;
 
 struct Box {
-  Point3 low{};
-  Point3 high{};
+  Vector3 low{};
+  Vector3 high{};
 };
 
-Box BoxOf(std::initializer_list<Point3> points) {
+Box BoxOf(std::initializer_list<Vector3> points) {
   Box box{*points.begin(), *points.begin()};
-  for (const Point3& p : points) {
+  for (const Vector3& p : points) {
     for (std::size_t k = 0; k < 3; ++k) {
       box.low[k] = std::min(box.low[k], p[k]);
       box.high[k] = std::max(box.high[k], p[k]);
@@ -38,17 +38,17 @@ bool Meet(const Box& a, const Box& b) {
 
 // Whether the way from p to q passes through the triangle (Moeller and Trumbore, "Fast, minimum
 // storage ray/triangle intersection", 1997).
-bool PassesThrough(const Point3& p, const Point3& q, const Point3& a, const Point3& b,
-                   const Point3& c) {
-  const Point3 way = q - p;
-  const Point3 ab = b - a;
-  const Point3 ac = c - a;
-  const Point3 h = Cross(way, ac);
+bool PassesThrough(const Vector3& p, const Vector3& q, const Vector3& a, const Vector3& b,
+                   const Vector3& c) {
+  const Vector3 way = q - p;
+  const Vector3 ab = b - a;
+  const Vector3 ac = c - a;
+  const Vector3 h = Cross(way, ac);
   const double determinant = Dot(ab, h);
   if (std::abs(determinant) < 1e-9) return false;  // along the triangle: other edges tell
-  const Point3 ap = p - a;
+  const Vector3 ap = p - a;
   const double u = Dot(ap, h) / determinant;
-  const Point3 g = Cross(ap, ab);
+  const Vector3 g = Cross(ap, ab);
   const double v = Dot(way, g) / determinant;
   const double s = Dot(ac, g) / determinant;
   return u >= 0 && v >= 0 && u + v <= 1 && s >= 0 && s <= 1;
@@ -61,8 +61,8 @@ std::vector<double> SmallestAngles(const Points& points, const std::vector<Trian
   for (const Triangle& t : triangles) {
     double least = std::numeric_limits<double>::max();
     for (std::size_t k = 0; k < 3; ++k) {
-      const Point3 a = points[t[(k + 1) % 3]] - points[t[k]];
-      const Point3 b = points[t[(k + 2) % 3]] - points[t[k]];
+      const Vector3 a = points[t[(k + 1) % 3]] - points[t[k]];
+      const Vector3 b = points[t[(k + 2) % 3]] - points[t[k]];
       least = std::min(least, kDegrees * std::atan2(Length(Cross(a, b)), Dot(a, b)));
     }
     smallest.push_back(least);
@@ -73,7 +73,7 @@ std::vector<double> SmallestAngles(const Points& points, const std::vector<Trian
 Facets MeasureFacets(const Points& points, const std::vector<Triangle>& triangles) {
   Facets facets;
   for (const Triangle& t : triangles) {
-    Point3 normal = Cross(points[t[1]] - points[t[0]], points[t[2]] - points[t[0]]);
+    Vector3 normal = Cross(points[t[1]] - points[t[0]], points[t[2]] - points[t[0]]);
     const double length = Length(normal);
     if (length > 0) {
       for (double& value : normal) value /= length;

@@ -1,7 +1,8 @@
-#include "model/face_tables.h"
+#include "mesh/face_tables.h"
 
 #include <algorithm>
 
+#include "engine/face_model_file.h"
 #include "support/error.h"
 
 namespace n3ds::tool {
@@ -49,6 +50,16 @@ std::size_t ExpressionByName(const std::string& name) {
   std::string known;
   for (const std::string& other : names) known += (known.empty() ? "" : ", ") + other;
   throw Error("there is no expression '" + name + "' (the model has " + known + ")");
+}
+
+Points VerticesOfCorners(const std::vector<float>& corners) {
+  if (corners.empty()) return {};
+  Points vertices(kModelVertices);
+  for (std::size_t i = 0; i < kMeshCorners; ++i) {
+    const float* p = &corners[3 * i];
+    vertices[FaceTriangles()[i / 3][i % 3]] = {p[0], p[1], p[2]};
+  }
+  return vertices;
 }
 
 }  // namespace n3ds::tool
