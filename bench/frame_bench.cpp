@@ -62,6 +62,12 @@ struct Host {
   Host& operator=(const Host&) = delete;
 };
 
+// One, three and five faces, each with a worker thread: what all threads use counts.
+void WithWorkers(benchmark::internal::Benchmark* bench) {
+  bench->Arg(1)->Arg(3)->Arg(5)->Unit(benchmark::kMicrosecond);
+  bench->MeasureProcessCPUTime()->UseRealTime();
+}
+
 void RigidFrame(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));
   auto frames = Frames(static_cast<int>(face_count));
@@ -75,13 +81,7 @@ void RigidFrame(benchmark::State& state) {
     frame = (frame + 1) % frames.size();
   }
 }
-BENCHMARK(RigidFrame)
-    ->Arg(1)
-    ->Arg(3)
-    ->Arg(5)
-    ->Unit(benchmark::kMicrosecond)
-    ->MeasureProcessCPUTime()
-    ->UseRealTime();
+BENCHMARK(RigidFrame)->Apply(WithWorkers);
 
 // Faces of the example tracks, with expressions and noise.
 void MaskFrame(benchmark::State& state) {
@@ -100,13 +100,7 @@ void MaskFrame(benchmark::State& state) {
     frame = (frame + 1) % frames.size();
   }
 }
-BENCHMARK(MaskFrame)
-    ->Arg(1)
-    ->Arg(3)
-    ->Arg(5)
-    ->Unit(benchmark::kMicrosecond)
-    ->MeasureProcessCPUTime()
-    ->UseRealTime();
+BENCHMARK(MaskFrame)->Apply(WithWorkers);
 
 // The life of a frame's pool, a task for each face that does nothing.
 void Pool(benchmark::State& state) {
@@ -124,13 +118,7 @@ void Pool(benchmark::State& state) {
     if (mcvParallelUninit(pool) != 0) state.SkipWithError("no pool");
   }
 }
-BENCHMARK(Pool)
-    ->Arg(1)
-    ->Arg(3)
-    ->Arg(5)
-    ->Unit(benchmark::kMicrosecond)
-    ->MeasureProcessCPUTime()
-    ->UseRealTime();
+BENCHMARK(Pool)->Apply(WithWorkers);
 
 void Matching(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));
