@@ -8,7 +8,6 @@ Debian's numpy, scipy and Pillow; the same bits every time.
     /usr/bin/python3 tools/make_mask_textures.py [FOLDER]
 """
 
-import re
 import sys
 import warnings
 from pathlib import Path
@@ -19,44 +18,31 @@ from scipy import interpolate, ndimage
 from scipy.cluster import vq
 
 ROOT = Path(__file__).resolve().parent.parent
+sys.path.insert(0, str(ROOT / "tools" / "face_model"))
+from measurements import DATA
+from shipped import Model
+from tables import default_contour, inner_landmarks
+from triangulate import boundary_rings
+
 SIZE = 512  # of a picture; a face on a photo seldom has more pixels
 FINE = 3    # drawn that much larger, for smooth edges
 PIXELS = SIZE * FINE
-
-
-def numbers(name):
-    text = re.sub(r"//.*", "", (ROOT / "data" / name).read_text())
-    return [float(n) for n in re.findall(r"-?\d+(?:\.\d+)?(?:e-?\d+)?", text)]
 
 
 class Layout:
     """Landmarks, holes and outer border of the face in the texture, 0 to 1, v down."""
 
     def __init__(self):
-        self.vertices = np.array(numbers("texture_coordinates.inc")).reshape(-1, 2)
-        self.triangles = np.array(numbers("triangles.inc"), int).reshape(-1, 3)
-        outline = np.array(numbers("default_contour_vertex_indices.inc"), int)
-        inner = np.array(numbers("inner_landmark_vertex_indices.inc"), int)
-        self.landmarks = self.vertices[np.concatenate([outline, inner])]
-        rings = sorted(self.borders(), key=len)
+        model = Model(DATA)
+        self.vertices, self.triangles = model.texture, model.triangles
+        self.landmarks = self.vertices[np.concatenate([default_contour(), inner_landmarks()])]
+        rings = sorted(boundary_rings(self.triangles), key=len)
         self.rim = self.vertices[rings.pop()]
         self.mouth = self.vertices[rings.pop(int(np.argmax(
             [self.vertices[r][:, 1].mean() for r in rings])))]
         self.eyes = sorted((self.vertices[r] for r in rings), key=lambda e: e[:, 0].mean())
         # The unit of all lengths: from the middle of one eye to that of the other.
         self.unit = self.eyes[1][:, 0].mean() - self.eyes[0][:, 0].mean()
-
-    def borders(self):
-        """Rings of vertices along edges that belong to one triangle only."""
-        edges = {(a, b) for t in self.triangles for a, b in zip(t, np.roll(t, -1))}
-        after = {a: b for a, b in edges if (b, a) not in edges}
-        rings = []
-        while after:
-            ring = [min(after)]
-            while ring[-1] in after:
-                ring.append(after.pop(ring[-1]))
-            rings.append(ring[:-1])
-        return rings
 
     def at(self, landmark, right=0.0, down=0.0):
         return self.landmarks[landmark] + self.unit * np.array([right, down])

@@ -16,7 +16,7 @@ from PIL import Image, ImageDraw
 import measurements
 import tables
 from shipped import Model
-from triangulate import boundary_edges, edge_owners
+from triangulate import boundary_edges, boundary_rings, edge_owners
 
 SIZE = 2048
 # Chains of landmarks that outline the features.
@@ -67,13 +67,7 @@ def skull(rings=24, sectors=40):
 def occluder(model):
     """The face without its holes, pulled back, and the skull."""
     caps, extra = [], []
-    after = dict(boundary_edges(model.triangles))
-    while after:
-        start, ring = min(after), []
-        v = start
-        while v in after:
-            ring.append(v)
-            v = after.pop(v)
+    for ring in boundary_rings(model.triangles):
         if len(ring) < 50:  # an eye or the mouth
             centre = len(model.mean) + len(extra)
             extra.append(model.mean[ring].mean(axis=0))

@@ -26,6 +26,19 @@ def boundary_edges(triangles):
     return sorted(e for e in directed if (e[1], e[0]) not in directed)
 
 
+def boundary_rings(triangles):
+    """The closed rings of vertices that the boundary edges make."""
+    after = dict(boundary_edges(triangles))
+    rings = []
+    while after:
+        ring, v = [], min(after)
+        while v in after:
+            ring.append(v)
+            v = after.pop(v)
+        rings.append(ring)
+    return rings
+
+
 def _cross(o, a, b):
     return (a[0] - o[0]) * (b[1] - o[1]) - (a[1] - o[1]) * (b[0] - o[0])
 

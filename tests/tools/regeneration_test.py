@@ -1,0 +1,77 @@
+#!/usr/bin/env python3
+"""Makes what scripts have made anew and compares it with the tree: SOURCE_FOLDER SCRATCH_FOLDER WHAT.
+
+WHAT is 'model' (data/) or 'assets' (examples/assets/). Numbers and meshes have to be the same bit
+for bit, pictures dot for dot. Ends with status 77 where a library is missing, which ctest counts as
+skipped.
+"""
+
+import shutil
+import subprocess
+import sys
+from pathlib import Path
+
+SKIPPED = 77
+MODEL = ["face_model.bin", "triangles.inc", "texture_coordinates.inc", "expression_names.inc"]
+OBJECTS = ["face.obj", "head_occluder.obj"]
+TEMPLATE = ["face_template.png", "template/mask_area.png", "template/wireframe.png",
+            "template/feature_lines.png", "template/landmark_numbers.png"]
+STICKERS = ["glasses.obj", "glasses.mtl", "hat.obj", "hat.mtl"]
+MASKS = ["mask_carnival.png", "mask_tiger.png", "mask_gold.png"]
+
+
+def is_there(*modules):
+    try:
+        for module in modules:
+            __import__(module)
+        return True
+    except ImportError as error:
+        print(f"skipped: {error}")
+        return False
+
+
+def is_same(one, other):
+    if one.suffix != ".png":
+        return one.read_bytes() == other.read_bytes()
+    from PIL import Image
+    a, b = (Image.open(path).convert("RGBA") for path in (one, other))
+    return a.size == b.size and a.tobytes() == b.tobytes()
+
+
+def run(script, *arguments):
+    subprocess.run([sys.executable, script, *arguments], check=True)
+
+
+def make_model(tools, scratch):
+    """Folder of the originals, and the names of what was made."""
+    run(tools / "face_model" / "generate.py", "--out", scratch)
+    if not is_there("PIL"):
+        return "data", MODEL
+    run(tools / "face_model" / "artists.py", "--data", scratch)
+    return "data", MODEL + OBJECTS + TEMPLATE
+
+
+def make_assets(tools, scratch):
+    run(tools / "make_sticker_assets.py", scratch)
+    if not is_there("PIL"):
+        return "examples/assets", STICKERS
+    run(tools / "make_mask_textures.py", scratch)
+    return "examples/assets", STICKERS + MASKS
+
+
+def main():
+    source, scratch = (Path(argument) for argument in sys.argv[1:3])
+    make = {"model": make_model, "assets": make_assets}[sys.argv[3]]
+    if not is_there("numpy", "scipy"):
+        return SKIPPED
+    shutil.rmtree(scratch, ignore_errors=True)
+    scratch.mkdir(parents=True)
+    folder, names = make(source / "tools", scratch)
+    wrong = [name for name in names if not is_same(scratch / name, source / folder / name)]
+    for name in wrong:
+        print(f"{folder}/{name} is not what its script makes")
+    return 1 if wrong else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
