@@ -1,16 +1,16 @@
 #!/usr/bin/env python3
 """Cuts the landmark tracks of examples/tracks out of longer recordings, and examples/one_face.txt.
 
-    tools/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [OUT_FOLDER]
+    tools/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [--out FOLDER]
 
 The folders hold the whole tracks named below. A cut keeps every `step`th frame, numbers the frames
 anew from 0, rounds the truth to six digits and drops the true 3-D points. Two tracks are turned and
 mirrored as a phone's cameras would deliver them.
 """
 
+import argparse
 import json
 import pathlib
-import sys
 
 # name of the example: folder, track, first frame, end, step, degree, mirror
 CUTS = {
@@ -104,9 +104,14 @@ def as_plain_numbers(lines, frames):
 
 
 def main():
-    folders = {"synthetic": pathlib.Path(sys.argv[1]), "real": pathlib.Path(sys.argv[2])}
-    out = pathlib.Path(sys.argv[3] if len(sys.argv) > 3 else
-                       pathlib.Path(__file__).parent.parent / "examples" / "tracks")
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("synthetic", type=pathlib.Path, help="folder of the whole synthetic tracks")
+    parser.add_argument("real", type=pathlib.Path, help="folder of the whole real tracks")
+    parser.add_argument("--out", type=pathlib.Path, help="folder to write to",
+                        default=pathlib.Path(__file__).parent.parent / "examples" / "tracks")
+    arguments = parser.parse_args()
+    folders = {"synthetic": arguments.synthetic, "real": arguments.real}
+    out = arguments.out
     out.mkdir(parents=True, exist_ok=True)
     for name, (folder, track, *how) in CUTS.items():
         lines = cut(folders[folder] / f"{track}.track.jsonl", *how)

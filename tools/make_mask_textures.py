@@ -8,6 +8,7 @@ Debian's numpy, scipy and Pillow; the same bits every time.
     /usr/bin/python3 tools/make_mask_textures.py [FOLDER]
 """
 
+import argparse
 import sys
 import warnings
 from pathlib import Path
@@ -446,7 +447,10 @@ def gold_leaf(face):
 
 
 def main():
-    folder = Path(sys.argv[1]) if len(sys.argv) > 1 else ROOT / "examples" / "assets"
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--out", type=Path, default=ROOT / "examples" / "assets",
+                        help="folder to write to")
+    folder = parser.parse_args().out
     folder.mkdir(parents=True, exist_ok=True)
     face = Layout()
     for name, draw in (("carnival", carnival), ("tiger", tiger), ("gold", gold_leaf)):

@@ -9,9 +9,9 @@ hairline at (0, 90, 82), widest head +-76, tops of the ears about (+-78, 14, -6)
     tools/make_sticker_assets.py [FOLDER]
 """
 
+import argparse
 import math
 import pathlib
-import sys
 
 
 def add(a, b):
@@ -304,8 +304,10 @@ def hat():
 
 
 def main():
-    folder = pathlib.Path(sys.argv[1] if len(sys.argv) > 1 else
-                          pathlib.Path(__file__).parent.parent / "examples" / "assets")
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--out", type=pathlib.Path, help="folder to write to",
+                        default=pathlib.Path(__file__).parent.parent / "examples" / "assets")
+    folder = parser.parse_args().out
     folder.mkdir(parents=True, exist_ok=True)
     for obj in (glasses(), hat()):
         obj.write(folder)

@@ -1,11 +1,12 @@
 #!/usr/bin/env python3
-"""Makes what scripts have made anew and compares it with the tree: SOURCE_FOLDER SCRATCH_FOLDER WHAT.
+"""Makes what scripts have made anew and compares it with the tree.
 
-WHAT is 'model' (data/) or 'assets' (examples/assets/). Numbers and meshes have to be the same bit
+The model is in data/, the assets are in examples/assets/. Numbers and meshes have to be the same bit
 for bit, pictures dot for dot. Ends with status 77 where a library is missing, which ctest counts as
 skipped.
 """
 
+import argparse
 import shutil
 import subprocess
 import sys
@@ -52,16 +53,21 @@ def make_model(tools, scratch):
 
 
 def make_assets(tools, scratch):
-    run(tools / "make_sticker_assets.py", scratch)
+    run(tools / "make_sticker_assets.py", "--out", scratch)
     if not is_there("PIL"):
         return "examples/assets", STICKERS
-    run(tools / "make_mask_textures.py", scratch)
+    run(tools / "make_mask_textures.py", "--out", scratch)
     return "examples/assets", STICKERS + MASKS
 
 
 def main():
-    source, scratch = (Path(argument) for argument in sys.argv[1:3])
-    make = {"model": make_model, "assets": make_assets}[sys.argv[3]]
+    makers = {"model": make_model, "assets": make_assets}
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("source", type=Path, help="root of the project")
+    parser.add_argument("scratch", type=Path, help="folder to write to, emptied first")
+    parser.add_argument("what", choices=makers)
+    arguments = parser.parse_args()
+    source, scratch, make = arguments.source, arguments.scratch, makers[arguments.what]
     if not is_there("numpy", "scipy"):
         return SKIPPED
     shutil.rmtree(scratch, ignore_errors=True)

@@ -6,6 +6,7 @@ An example is a block marked c whose first line is a comment with its file name.
 when one does not compile, or when a document has a block without a name.
 """
 
+import argparse
 import os
 import re
 import subprocess
@@ -32,6 +33,7 @@ def compiles(text, name, folder):
 
 
 def main():
+    argparse.ArgumentParser(description=__doc__.splitlines()[0]).parse_args()
     good = total = 0
     with tempfile.TemporaryDirectory() as folder:
         for document in sorted([*ROOT.glob("*.md"), *(ROOT / "docs").glob("*.md")]):

@@ -7,6 +7,7 @@ Needs Debian's python3-numpy, python3-pil and fonts-dejavu-core:
 The pictures depend on data/face_statistics alone; a second run gives the same bytes.
 """
 
+import argparse
 from pathlib import Path
 
 import frame_pictures
@@ -17,6 +18,7 @@ FOLDER = Path(__file__).resolve().parents[2] / "docs" / "coordinates"
 
 
 def main():
+    argparse.ArgumentParser(description=__doc__.splitlines()[0]).parse_args()
     FOLDER.mkdir(parents=True, exist_ok=True)
     frame_pictures.draw_pixel(FOLDER)
     frame_pictures.draw_camera(FOLDER)

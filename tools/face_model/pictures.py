@@ -1,6 +1,8 @@
 #!/usr/bin/env python3
 """Draws the pictures of docs/face-model.md: python3 tools/face_model/pictures.py"""
 
+import argparse
+
 import numpy as np
 
 import measurements
@@ -18,6 +20,7 @@ def view(model, points, yaw=0.0, pitch=0.0, size=220, **options):
 
 
 def main():
+    argparse.ArgumentParser(description=__doc__.splitlines()[0]).parse_args()
     FOLDER.mkdir(parents=True, exist_ok=True)
     model = Model(measurements.DATA)
     views = [view(model, model.mean, y, p, 360, wires=w)
