@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How well things hold to a head: four points fixed to it (the nose bridge, above the forehead, in
 // front of each ear) are drawn by an estimated pose and compared with where they are in the true
 // picture.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The dense meshes of a mask frame, beside the same sum as a matrix-vector product in Eigen. The
 // counter `difference` is the largest between both, in mm.
 #include <benchmark/benchmark.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "eigen_mesh.h"
 
 #include <Eigen/Core>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A face's mesh as one matrix-vector product in Eigen.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "eigen_product.h"
 
 #include <Eigen/Core>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Eigen's product of the same row-major arrays.
 #pragma once
 

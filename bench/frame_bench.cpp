@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // One rigid frame, whole and by its parts: matching, pose fit, contour; and one mask frame. What
 // the task pool costs is in task_pool_bench.
 #include <benchmark/benchmark.h>

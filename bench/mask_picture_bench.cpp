@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A mask picture drawn onto a tracked face and blended into a camera picture of 1280 x 720, beside
 // OpenCV on one thread. Each bench compares its result with the engine's: the counter `off` is the
 // share of pixels that differ by more than kAllowedLevels in some channel, of those drawn on.

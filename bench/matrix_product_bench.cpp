@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The float matrix product at the sizes of the fits, beside Eigen. Every run is checked against the
 // product in double; the counter `error` is the largest difference, relative to the sum of the
 // terms' magnitudes.

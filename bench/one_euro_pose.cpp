@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "one_euro_pose.h"
 
 #include <cmath>

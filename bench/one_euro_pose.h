@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A one-euro filter on a head pose: Casiez, Roussel and Vogel, "1 euro filter: a simple speed-based
 // low-pass filter for noisy input in interactive systems" (2012). Slow movements are smoothed
 // strongly, fast ones hardly.

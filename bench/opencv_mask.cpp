@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "opencv_mask.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The mask's warp and blend as one would write them with OpenCV.
 #pragma once
 

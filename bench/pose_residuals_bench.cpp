@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What a pass of the pose solver consists of, on one of its problems.
 #include <benchmark/benchmark.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The pose solver beside Ceres' TinySolver in float, on the same problems: a face of 95 points, its
 // landmarks rounded to pixels with noise, and as start the pose of the frame before.
 //

@@ -1,4 +1,5 @@
 #!/bin/sh
+# SPDX-License-Identifier: MIT
 # Runs every benchmark program and writes one CSV of medians each; without program names also the
 # comparison of the tracking with solvePnP, a text.
 # usage: bench/run.sh [OUTPUT_DIRECTORY] [PROGRAM_NAME...]      default: build/bench/results, all

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The fits of shape coefficients to one face's landmarks, on the shipped face model.
 #include <benchmark/benchmark.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // OpenCV's solvePnP on the frames of tracks with truth, judged by the same code as 'n3ds eval' and
 // printed beside the engine: mean landmark positions of the population, iterative solver, each
 // person's last pose as the start of the next frame, the engine's assumption of the focal length;

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "synthetic_face.h"
 
 #include <cmath>

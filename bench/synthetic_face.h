@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Landmark sequences made from the shipped face model, for benchmarks that need plausible input and
 // no files beside the model.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What a task pool costs per frame, beside the bare threads it cannot do without.
 #include <benchmark/benchmark.h>
 #include <pthread.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "tiny_solver.h"
 
 #include <ceres/tiny_solver.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Ceres' TinySolver in float on the engine's pose problems, in a file of its own because Eigen
 // chooses its instructions when it is compiled.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "tracked_faces.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Faces of an example track, followed in mask mode: what the benchmarks of meshes and mask pictures
 // work on.
 #pragma once

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 # 64-bit Arm Linux with Debian's cross compiler; programs run under qemu.
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_SYSTEM_PROCESSOR aarch64)

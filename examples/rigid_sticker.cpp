@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A sticker on one face, from landmarks to the place on the picture.
 //   rigid_sticker data/face_model.bin < examples/one_face.txt
 #include <array>

@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: MIT */
 /* Tracks faces in a sequence of landmarks and prints where each head is and how it is turned.
  *
  *   track_faces FACE_MODEL LANDMARKS

@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: MIT */
 /*
  * Norvale 3-D sticker engine: exported core functions.
  *

@@ -1,5 +1,7 @@
 #!/usr/bin/env bash
-# The tree's text: no tabs, no trailing blanks, a newline at the end, and no stray entries in the root.
+# SPDX-License-Identifier: MIT
+# The tree's text: no tabs, no trailing blanks, a newline at the end, a licence line in every source
+# file; no stray entries in the root.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
@@ -22,6 +24,12 @@ done < <(git ls-files | grep -E '(^|/)-' || true)
 
 sources=('*.h' '*.c' '*.cpp' '*.inc' '*.py' '*.sh' '*.cmake' '*CMakeLists.txt' 'src/exports.map'
   demo test .ci/run)
+while IFS= read -r file; do
+  if ! head -n 3 -- "$file" | grep -q 'SPDX-License-Identifier: MIT'; then
+    complain "$file: no licence line"
+  fi
+done < <(git ls-files -- "${sources[@]}")
+
 while IFS= read -r file; do
   [ -s "$file" ] || continue
   grep -Iq . "$file" || continue

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: MIT
 # Installs the Debian packages that are missing; does nothing, and needs no rights, when none is.
 #   scripts/install_packages.sh GROUP...     groups: build tools test check arm64 bench
 # Other scripts may source this file and call `install_missing_packages GROUP...`.

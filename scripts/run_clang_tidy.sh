@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: MIT
 # clang-tidy over the project's own sources; any finding is an error.
 #   scripts/run_clang_tidy.sh BUILD_DIRECTORY   (configured, with compile_commands.json)
 set -euo pipefail

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What rigid and mask frames share on their way through the engine object.
 #pragma once
 

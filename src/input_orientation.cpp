@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // From the delivered picture's landmarks to the upright, unmirrored ones.
 #include "math/integer_arithmetic.h"
 #include "norvale_face_shape_imp.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Mask frames: tracking, dense meshes, and the meshes unrolled for the renderer.
 #include <cstring>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Life of a core context: creation, face model, release.
 
 // The system's assertion handler is declared only where assertions are on.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The exported engine functions: thin wrappers around the engine object.
 #include "norvale_3d_sticker_engine.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "norvale_face_shape_imp.h"
 
 #include <cstdio>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The object behind the exported engine handle: owns the tracking core, the model's bytes, the
 // orientation of the input and the output memory of mask mode.
 #pragma once

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Cuts the landmark tracks of examples/tracks out of longer recordings, and examples/one_face.txt.
 
     tools/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [--out FOLDER]

@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: MIT
 """Draws examples/assets/mask_*.png: three mask pictures in the texture layout of the face model.
 
 Everything is placed by the landmarks' vertices and measured in eye distances, so that running this

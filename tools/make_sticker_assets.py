@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Writes examples/assets: a pair of glasses and a hat as OBJ, fitted to the mean face.
 
 Frame: that of the engine's model matrix, mm. x to the image right, y up, z out of the face, origin

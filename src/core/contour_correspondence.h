@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Ties the 19 outline landmarks to the model vertices that form the silhouette under a pose.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Convex hull of projected points, by gift wrapping that prefers the smallest turn.
 #pragma once
 

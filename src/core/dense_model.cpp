@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/dense_model.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The dense mesh of a face from its identity and expression coefficients.
 #pragma once
 

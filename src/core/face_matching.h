@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Carries each face's track from the frame before to its place in this frame.
 #pragma once
 

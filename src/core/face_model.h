@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The face-model file: checks it and unpacks it into the context.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/face_report.h"
 
 #include "core/landmarks_3d.h"

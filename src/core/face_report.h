@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What both modes report of a fitted face: its matrices and 3-D landmarks.
 #pragma once
 

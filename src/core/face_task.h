@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What a worker thread gets to know about its face. All pointers refer to the face's own slot of
 // the context, except where they are shared by all faces and only read.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/landmark_motion.h"
 
 #include <cmath>

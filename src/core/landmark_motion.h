@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How the landmarks moved since the last frame, and how much they are held back for it.
 #pragma once
 

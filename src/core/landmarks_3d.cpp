@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/landmarks_3d.h"
 
 #include <algorithm>

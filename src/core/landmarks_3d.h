@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // 3-D landmarks of a fitted face: each 2-D landmark put back into space at the depth of its model
 // vertex.
 #pragma once

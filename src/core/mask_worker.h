@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The per-face task of mask mode.
 #pragma once
 

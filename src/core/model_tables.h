@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The engine's constant tables. Their values stand in data/, one file a table.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The contour candidate that lies nearest to a point of the picture.
 #pragma once
 

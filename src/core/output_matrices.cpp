@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/output_matrices.h"
 
 #include <cstring>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // From a fitted pose to what OpenGL takes.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Fits the rigid head pose of one face to its 95 landmarks.
 #pragma once
 

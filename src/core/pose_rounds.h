@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The alternation of pose fit and contour update that every worker is made of.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/pose_weights.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Solver weights and state of the face, read off the landmarks of one frame.
 #pragma once
 

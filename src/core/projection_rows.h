@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The perspective projection as linear equations in a vertex's position, for the fits of shape
 // coefficients; all of them build their systems from these.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Reports the matrices and 3-D landmarks of the last rigid frame.
 #include "core/face_report.h"
 #include "core/landmarks_3d.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/rigid_pose_smoothing.h"
 
 #include <cmath>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How the full rigid worker smooths the fitted pose over time.
 #pragma once
 

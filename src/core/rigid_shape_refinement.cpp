@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/rigid_shape_refinement.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The small refits of identity and expression that the full rigid worker makes every frame, so that
 // the 3-D landmarks follow the face.
 #pragma once

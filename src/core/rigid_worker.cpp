@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/rigid_worker.h"
 
 #include <cstring>

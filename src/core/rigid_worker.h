@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The per-face tasks of rigid mode. Each takes a RigidFaceTask and returns null.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The coefficient fits of the mask mode: who the person is (identity) and what the face does
 // (expression), each one linear least-squares problem under a fixed pose.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/shape_sums.h"
 
 #include "math/integer_arithmetic.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Weighted sums of the model's 16-bit vectors, coordinate by coordinate: what a face's mesh is made
 // of. Lanes of the vector forms are different coordinates, never different terms of one sum, so
 // every form gives the same bits as the portable one, which is the definition.

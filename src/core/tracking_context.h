@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the tracking core keeps from frame to frame.
 #pragma once
 

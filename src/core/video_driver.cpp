@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The two per-frame entry points of the tracking core: they check a frame, match its faces to the
 // tracks and run one worker per face on a task pool of the frame's own.
 #include <algorithm>

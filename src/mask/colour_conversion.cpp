@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mask/colour_conversion.h"
 
 #include "norvale_3d_sticker_core.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Full-range BT.601 colour conversion in 15-bit fixed point. Components are 0..255. Inline, so that
 // loops over them vectorise; RGB2YUV and YUV2RGB export them for packed words.
 #pragma once

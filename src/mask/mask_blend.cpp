@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Compositing of a mask picture over a camera image: the mask takes on the light of the image
 // underneath, then is blended in by its alpha in 8-bit fixed point.
 //

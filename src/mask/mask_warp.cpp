@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The exported mask warp: checks, the output picture, and the tracked face's pose and camera.
 #include <cstddef>
 #include <cstdint>

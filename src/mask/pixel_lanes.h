@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A pixel's four channels as four floats, in the vector form of this processor or plainly. All
 // forms give the same bytes.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mask/warp_face.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Drawing of a mask picture over the image of a face mesh, triangle by triangle.
 #pragma once
 

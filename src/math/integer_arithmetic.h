@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Conversions and integer arithmetic that mean the same on every processor and are never undefined.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Dense linear systems: LU factorisation without pivoting (Doolittle), square systems, and least
 // squares through the normal equations.
 #include <cmath>

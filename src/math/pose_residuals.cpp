@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "math/pose_residuals.h"
 
 #include <algorithm>

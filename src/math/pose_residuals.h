@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The residuals that the pose solver minimises: how far a head model's points, moved by a pose and
 // projected by a pinhole camera, land from a face's landmarks in the picture.
 #pragma once

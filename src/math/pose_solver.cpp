@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Levenberg-Marquardt with the gain-ratio damping of Madsen, Nielsen and Tingleff, "Methods for
 // Non-Linear Least Squares Problems" (2004), algorithm 3.16.
 #include "math/pose_solver.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The pose solver with an account of how the solve went.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Rotations as quaternions, matrices and Euler angles, and the inverse of a 3x3 matrix.
 //
 // Quaternions are w, x, y, z; matrices are row-major and act on column vectors; Euler angles are

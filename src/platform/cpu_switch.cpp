@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Processor counts, and the two operations that switch offline cores on and put them back.
 //
 // Both give up quietly at the first file that resists: writing takes rights an app seldom has, and

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the engine asks the system about processors.
 #pragma once
 

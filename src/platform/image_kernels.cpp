@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Kernels on 8-bit pictures: halving, OR, YUYV splitting and motion masks.
 #include <algorithm>
 #include <cstddef>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Integral pictures in three entry widths.
 #include <algorithm>
 #include <cstddef>

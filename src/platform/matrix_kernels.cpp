@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Dense matrix kernels on top of the float product, and the integer products.
 #include <algorithm>
 #include <cstddef>

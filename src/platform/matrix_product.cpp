@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The float matrix product, the one kernel the fitting spends its time in.
 //
 // Its operands are small (7 x 190 by 190 x 7 up to 20 x 210 by 210 x 20, and the same with one

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The float matrix product: its definition, and the vector form of this build and processor.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The memory layer: the system heap, or a first-fit chain of blocks in an area of the caller's.
 //
 // A pool is a row of blocks, each a header followed by its payload; the next header starts where

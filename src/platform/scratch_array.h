@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // An array taken from the memory layer and given back at the end of its scope, on every path.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Square roots: exact, fast reciprocal, and by table.
 #include <algorithm>
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A small pool of threads for the tasks of one frame: a ring of pending tasks, a ring of finished
 // ids, and a lock and a condition for each.
 #include "platform/task_pool.h"

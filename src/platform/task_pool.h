@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The task pool's own record.
 #pragma once
 

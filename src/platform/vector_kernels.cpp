@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Distances, dot products, bit counts and divisions of vectors.
 #include <algorithm>
 #include <cmath>

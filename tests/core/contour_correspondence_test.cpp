@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/contour_correspondence.h"
 
 #include <gmock/gmock.h>

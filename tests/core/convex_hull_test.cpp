@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/convex_hull.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/face_matching.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/face_model.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the tests of the core share: the shipped face model read by their own code, landmarks of
 // model faces under known poses, and a core context with a model in it.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Makes one allocation of the engine fail, and finds memory that is not given back. For test
 // programs linked with n3ds_fail_allocations (tests/core/CMakeLists.txt), which puts this between
 // the engine and MMemAlloc and MMemFree.

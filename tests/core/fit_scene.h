@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A made-up face model and pictures of its shapes, for the tests of the coefficient fits.
 #pragma once
 

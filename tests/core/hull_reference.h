@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The convex hull walk written down once more, as plainly as it can be, to compare with.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/mask_worker.h"
 
 #include <gtest/gtest.h>

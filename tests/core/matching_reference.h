@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The matching of faces to tracks written down once more, as plainly as it can be, to compare with.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/model_tables.h"
 
 #include <gmock/gmock.h>

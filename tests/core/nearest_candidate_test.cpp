@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/nearest_candidate.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/pose_fitting.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/pose_rounds.h"
 
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Every allocation of every call of rigid mode fails once.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // N3DS_GetRigidMatrix: what a rigid frame reports.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The rigid workers written down once more, each as one list of steps, to compare with. The steps
 // that have tests of their own (fits, contour updates, weights, refits) are called, not repeated.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "core/shape_fitting.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The rigid driver, and what both drivers share.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

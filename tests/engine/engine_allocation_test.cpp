@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Every request of an initialisation to the system heap fails once. Linked with --wrap=malloc and
 // --wrap=free, so that the requests of the engine's objects pass through here.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The exported engine functions: results, life of an engine, version.
 #include <gtest/gtest.h>
 #include <sys/stat.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the tests of the engine interface share: engines and output records that clean up after
 // themselves, and upright landmarks as a turned or mirrored camera would deliver them.
 #pragma once

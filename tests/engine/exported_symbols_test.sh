@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: MIT
 # The shared library exports what the public headers declare and nothing else, and is fit for
 # devices with 16 KB pages.
 #   exported_symbols_test.sh LIBRARY SOURCE_DIRECTORY NM READELF

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Rigid frames through the exported engine functions.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Both modes give the same bits on every machine, with every compiler and at every optimisation
 // level: hashes of all outputs of whole tracks, generated ones and the example tracks.
 //

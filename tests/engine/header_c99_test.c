@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: MIT */
 /* The public headers serve a C99 host: each stands alone, and every function can be named. */
 #include "norvale_3d_sticker_core.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The public headers serve a C++ host that links the shared library.
 #include "norvale_3d_sticker_engine.h"
 // The engine header above stands alone; the core header brings it along.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // CNorvaleFaceShapeImp::TransformInputInfo: from the delivered picture's landmarks to upright ones.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

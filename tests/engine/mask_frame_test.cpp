@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Mask frames through the exported engine functions.
 #include <gtest/gtest.h>
 

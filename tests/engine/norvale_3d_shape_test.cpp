@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Life of a core context.
 #include <gtest/gtest.h>
 

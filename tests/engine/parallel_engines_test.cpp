@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Distinct engines on threads of their own do not disturb each other.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Tracking against the truth of the synthetic example tracks: poses within bounds, nobody lost,
 // nobody taken for somebody else.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Pictures for the tests of the image functions. Every plane is a block of its own of exactly the
 // promised size, so that a sanitizer sees one byte too many.
 #pragma once

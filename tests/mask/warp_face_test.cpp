@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mask/warp_face.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The mask warp written down once more, as slowly and plainly as it can be: every span of a
 // triangle is listed first, then every pixel of the picture is asked whether it lies in one.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A mesh of few triangles, its texture layout and a camera, for the tests of the mask warp.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the tests of the numerical toolkit share.
 #pragma once
 

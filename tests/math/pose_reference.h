@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The pose solver written down plainly, element by element, to hold the engine's against. Nothing
 // is shared with it but the linear solver, which has tests of its own.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A head of 95 points and pictures of it under known poses, for tests and benchmarks of the solver.
 #pragma once
 

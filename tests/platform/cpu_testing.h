@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Processors of the tests' own: counts that a test sets, and core switches in a new directory.
 #pragma once
 

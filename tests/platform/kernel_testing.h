@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the kernel tests share: arrays that end at an unreadable page, comparison by bits, and
 // random values with the awkward ones among them.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "platform/matrix_product.h"
 
 #include <gtest/gtest.h>

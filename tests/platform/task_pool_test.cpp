@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "platform/task_pool.h"
 
 #include <gmock/gmock.h>

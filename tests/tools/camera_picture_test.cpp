@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Pictures in camera formats, and the mask's way onto them against the graphics system's drawing.
 #include "render/camera_picture.h"
 

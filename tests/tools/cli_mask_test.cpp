@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // 'n3ds mask' and 'n3ds mesh' as their user meets them.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

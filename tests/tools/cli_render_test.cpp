@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // 'n3ds render' as its user meets it.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The tool as its user meets it: exit codes, one sentence on stderr, nothing half-written.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

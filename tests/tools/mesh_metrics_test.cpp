@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Mesh scores on the mean face, whose landmarks are put exactly where they should be or off by a
 // known distance.
 #include "eval/mesh_metrics.h"

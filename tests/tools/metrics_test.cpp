@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Metrics on made-up tracks whose pose errors are known exactly.
 #include "eval/metrics.h"
 

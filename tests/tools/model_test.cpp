@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Faces made from a model file, the measures of a mesh, and that every check can fail.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Makes what scripts have made anew and compares it with the tree.
 
 The model is in data/, the assets are in examples/assets/. Numbers and meshes have to be the same bit

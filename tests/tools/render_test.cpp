@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Pictures, meshes and the scene.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

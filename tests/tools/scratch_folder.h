@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // An empty folder for one test, removed with all it holds.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Output files, tables and results.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

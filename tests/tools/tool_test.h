@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Fixture of tests that run the tool as a program, in an empty folder.
 #pragma once
 

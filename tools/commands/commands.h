@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The tool's commands. Each adds its options to the parser and runs when it was chosen; it throws
 // Error for anything the user should read in one sentence.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds eval: how far the engine's poses are from the truth of synthetic tracks.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Frames of a track as commands pick, name and write them.
 #pragma once
 

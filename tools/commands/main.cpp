@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds: runs landmark tracks through the engine, judges and draws the results.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

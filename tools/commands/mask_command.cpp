@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds mask: a mask picture on the faces of a photo, through the library's own image functions.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

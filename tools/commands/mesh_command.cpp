@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds mesh: the dense meshes of a track as OBJ files, one a frame.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds model check: the geometric checks of a face model as a table.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds model, and n3ds model info: what is in a face-model file, and whether it can serve.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The commands under 'n3ds model', a file each ('info' is with 'model' itself).
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds model export: a face of a model as a Wavefront OBJ file.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

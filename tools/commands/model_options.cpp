@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "commands/model_options.h"
 
 #include <CLI/Config.hpp>

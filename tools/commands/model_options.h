@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Options that name a face of a model file.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds model render: a face of a model from several sides.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "commands/options.h"
 
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds render: pictures and films of stickers on the tracked faces.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

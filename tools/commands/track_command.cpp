@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // n3ds track: a track in, matrices and 3-D landmarks out, with a summary of how it went.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """A drawing surface for the documents: smooth lines, one typeface, small palette PNGs."""
 
 import math

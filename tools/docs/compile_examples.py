@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Compiles the C examples of the documents, as C99 and as C++17, with warnings as errors.
 
     python3 tools/docs/compile_examples.py

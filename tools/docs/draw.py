@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Draws the pictures of docs/coordinates.md into docs/coordinates/.
 
 Needs Debian's python3-numpy, python3-pil and fonts-dejavu-core:

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The mean face of data/face_statistics as the pictures show it."""
 
 import csv

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The frames: pixels, camera and viewer, and the two frames of the head."""
 
 import math

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The numbered pictures of the landmark layouts."""
 
 import numpy as np

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """How the delivered picture of an upright person looks: one picture for each degree and mirror."""
 
 import math

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: MIT
 # Draws the stickers and masks of README.md with n3ds, in 256 colours to keep the repository small.
 #   tools/docs/sticker_pictures.sh     after ./demo, which builds n3ds and fetches the photo
 set -euo pipefail

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Mask mode through the library's core functions, for what the engine interface does not hand out:
 // the mask image functions work on the core and its meshes.
 #pragma once

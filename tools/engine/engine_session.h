@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // One run of the engine over a track, through its public functions only.
 #pragma once
 

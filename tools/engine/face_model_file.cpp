@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "engine/face_model_file.h"
 
 #include <fstream>

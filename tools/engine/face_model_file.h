@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The face-model file as data: what 'n3ds model info' reports on and the renderer takes its head
 // from. The engine reads the file on its own.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the engine says about the faces of a frame. Plain data, so that everything that judges or
 // draws results works without the engine.
 #pragma once

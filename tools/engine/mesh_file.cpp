@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "engine/mesh_file.h"
 
 #include <array>

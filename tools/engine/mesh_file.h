@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The dense meshes of a frame as a Wavefront OBJ file, for other tools.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "engine/results_file.h"
 
 #include <charconv>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Results of a tracked sequence as JSON lines.
 //
 // Line 1: {"format":"face-track-results","version":1,"width":W,"height":H,"landmarks":N,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "eval/mesh_metrics.h"
 
 #include <algorithm>

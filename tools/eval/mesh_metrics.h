@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How well the dense meshes of mask mode fit the landmarks, and whether they are sound.
 #pragma once
 

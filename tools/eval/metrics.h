@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How far estimated head poses are from the true ones of a track.
 //
 // Poses take a head frame to the camera frame of the upright picture (x right, y down, z forward,

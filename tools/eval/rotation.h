@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // 3x3 rotations, row-major, in double: what judging poses needs and no more.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "eval/score_table.h"
 
 #include "support/statistics.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Scores of several tracks as one table, with a last row over all of them.
 #pragma once
 

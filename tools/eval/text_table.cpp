@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "eval/text_table.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A table for the terminal (columns lined up) or as CSV.
 #pragma once
 

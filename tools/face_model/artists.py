@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Writes what artists need from the model in data/: python3 tools/face_model/artists.py
 
 data/face.obj           mean face with texture coordinates, upright head frame, mm

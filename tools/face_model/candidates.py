@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Chooses the mesh vertices that serve as contour candidates: where outlines of heads run."""
 
 import numpy as np

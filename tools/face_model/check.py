@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Checks the face model in data/ against the measured figures: python3 tools/face_model/check.py
 
 What can be checked on the model file alone is in 'n3ds model check'. Ends with status 1 when a

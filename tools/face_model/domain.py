@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The flat half face on which the mesh is laid out, and its place in the texture.
 
 Flat coordinates are millimetres, x right and y up, the half at image left (x <= 0); texture

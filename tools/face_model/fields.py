@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Smooth fields over a triangle mesh through values given at places on it.
 
 The smoothness is the integral of squared second derivatives, in the hinge form of Bergou et al.,

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Spreads a triangulated surface out flat with little distortion and without folds.
 
 Minimises the symmetric Dirichlet energy (Smith and Schaefer, "Bijective parameterization with free

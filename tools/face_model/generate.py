@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Rebuilds the face model in data/ from the measured figures: python3 tools/face_model/generate.py
 
 The result is the same, bit for bit, in every run. See docs/face-model.md.

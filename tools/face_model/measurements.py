@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Reads the measured figures that the face model is built from (data/face_statistics)."""
 
 import csv

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The nostril, which the measured points leave open: a rim and a shallow hollow of our own.
 
 The measured points inside the cavity lie up to 15 mm deep; a mask wants a hollow that looks dark

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Gives every vertex its number: the tables fix some, neighbours stay near in number."""
 
 import numpy as np

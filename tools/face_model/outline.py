@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Rows of vertices on cheeks and jaw along which the outline landmarks wander.
 
 When the head turns, the outline landmark of a row slides along it, from before the ear towards the

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
 """Draws the pictures of docs/face-model.md: python3 tools/face_model/pictures.py"""
 
 import argparse

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Spreads mesh vertices so that the edges get the lengths wanted for them."""
 
 import numpy as np

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Draws triangle meshes to pictures with a depth buffer; nothing but numpy and Pillow."""
 
 import numpy as np

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Joins the measured points of one half of the face to triangles and spreads them out flat.
 
 Only the half at image left (x <= 0) is worked on; the other half is its mirror image.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The model in data/, read back for the checker, the artists' files and the pictures."""
 
 import re

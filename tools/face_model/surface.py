@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Lifts the flat mesh to the smooth surface through the measured points, with its modes."""
 
 from dataclasses import dataclass

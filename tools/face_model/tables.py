@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """The tables of data/ that tie vertices to landmarks; they are given, not generated."""
 
 import re

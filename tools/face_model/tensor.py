@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """How an identity changes an expression: the interaction tensor.
 
 Deformation transfer (Sumner and Popovic, 2004) to first order: an expression turns and stretches

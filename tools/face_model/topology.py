@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Lays out the vertices and triangles of the half face and mirrors them to the whole mesh.
 
 The counts are fixed: 1812 vertices and 3456 triangles with the two eyes and the mouth open leave

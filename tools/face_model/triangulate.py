@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Delaunay triangulation in the plane that keeps given edges, and flips by shape in space."""
 
 import numpy as np

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: MIT
 """Writes the model file and the tables of data/."""
 
 import numpy as np
@@ -48,7 +49,7 @@ def read_model(path):
 
 def _table(path, comment, rows, a_line):
     with open(path, "w", newline="\n") as file:
-        file.write(f"// {comment}\n")
+        file.write(f"// SPDX-License-Identifier: MIT\n// {comment}\n")
         for start in range(0, len(rows), a_line):
             file.write(" ".join(rows[start:start + a_line]) + "\n")
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mesh/face_tables.h"
 
 #include <algorithm>

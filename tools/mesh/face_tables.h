@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The tables of data/ that belong to every face model: what the file's vertices are joined to,
 // where they lie in the texture, and which of them stand for landmarks.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mesh/mesh_shape.h"
 
 #include <algorithm>

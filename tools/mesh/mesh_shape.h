@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Measures of a mesh in space: angles, folds, cuts.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mesh/mesh_topology.h"
 
 #include <algorithm>

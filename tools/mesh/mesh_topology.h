@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // How the triangles of a mesh hang together.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "mesh/obj_writer.h"
 
 #include <charconv>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Faces as Wavefront OBJ, for other tools.
 #pragma once
 

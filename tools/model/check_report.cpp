@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "model/check_report.h"
 
 #include <algorithm>

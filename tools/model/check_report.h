@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // What the checks of a face model found.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "model/face_shapes.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A model file's shapes in millimetres, and the faces they add up to.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "model/model_checks.h"
 
 namespace n3ds::tool {

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The geometric checks of a face model, a section each.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "model/obj_export.h"
 
 #include <ostream>

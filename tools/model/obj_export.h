@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Faces as Wavefront OBJ files.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Random people, the same on every machine.
 #pragma once
 

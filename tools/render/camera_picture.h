@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Pictures in the formats of camera buffers, as the library's image functions take them.
 #pragma once
 

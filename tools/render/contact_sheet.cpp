@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/contact_sheet.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Many frames on one picture: a grid of tiles with the frame's number in the corner.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/egl_context.h"
 
 #include <EGL/eglext.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // An OpenGL ES 3 context without a window or display, current on the thread that made it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A linked pair of shaders.
 #pragma once
 

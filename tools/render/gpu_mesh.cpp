@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/gpu_mesh.h"
 
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A mesh in the memory of the graphics system. Attribute 0 is the position, 1 the normal.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/mask_mesh.h"
 
 #include <cstddef>

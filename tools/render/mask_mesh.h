@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The engine's dense mesh of one face in the memory of the graphics system, replaced every frame.
 // Attribute 0 is the position, 1 the normal, 2 the texture coordinate (v down). Vertex i is corner
 // i % 3 of triangle i / 3.

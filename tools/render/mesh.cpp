@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/mesh.h"
 
 #include <cmath>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Triangle meshes with the material of each part.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/obj_file.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Wavefront OBJ files with their material library, as far as stickers need them: v, vn, f (polygons
 // of any size, v//vn or v/vt/vn), usemtl and mtllib; newmtl, Kd, d and Ns in the library. Other
 // statements are passed over.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A picture in memory, and PNG and JPEG files.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/render_target.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A picture to draw into, several samples a pixel for smooth edges.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Draws what a user of stickers sees: a picture or a plain ground, and on every face a hat and a
 // pair of glasses, placed by nothing but the engine's three matrices, or its dense mesh, lit, as
 // wireframe or under a mask picture.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Meshes made by formula: the head under the stickers and the coordinate tripod.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // A face seen from several sides, lit, for looking at models.
 #pragma once
 

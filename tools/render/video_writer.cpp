@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "render/video_writer.h"
 
 #include <fcntl.h>

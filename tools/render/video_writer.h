@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // An MP4 film, encoded by ffmpeg at the other end of a pipe.
 #pragma once
 

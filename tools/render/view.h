@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Which part of the upright picture is drawn, and how large.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "support/atomic_file.h"
 
 #include <unistd.h>

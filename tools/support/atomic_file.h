@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Output that is either whole or not there: written beside its place under a temporary name and
 // renamed on Commit. Without Commit the temporary is removed and what stood there before stays.
 #pragma once

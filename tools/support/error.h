@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // The tool's error: one sentence for the person at the terminal, naming the file and, where there
 // is one, the line.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // One line of progress on the terminal, rewritten in place. Silent when stderr is no terminal.
 #pragma once
 

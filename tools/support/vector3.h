@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Points and directions in space.
 #pragma once
 

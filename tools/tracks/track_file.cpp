@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "tracks/track_file.h"
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // Landmark tracks: what a face detector saw, frame by frame, as JSON lines (*.track.jsonl).
 //
 // Line 1 is the header, every further line one frame; docs in examples/tracks/README.md. The reader

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 #include "tracks/upright.h"
 
 #include <cstddef>

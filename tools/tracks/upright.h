@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: MIT
 // From the picture as delivered to the upright, unmirrored frame in which the results are given.
 #pragma once
 
