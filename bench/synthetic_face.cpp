@@ -7,7 +7,7 @@
 #include <stdexcept>
 
 #include "core/face_model.h"
-#include "core/landmarks_3d.h"
+#include "core/model_tables.h"
 
 namespace n3ds {
 

@@ -58,6 +58,8 @@ enum {
 
 enum {
   N3DS_MAX_FACES = 5,              /* faces a frame call accepts */
+  N3DS_LANDMARKS_101 = 101,        /* landmarks per face: the short layout */
+  N3DS_LANDMARKS_165 = 165,        /* landmarks per face: the long layout; no other is accepted */
   N3DS_VERTEX_COUNT = 1812,        /* vertices of the face model */
   N3DS_TRIANGLE_COUNT = 3456,      /* triangles of the face model */
   N3DS_MASK_CORNER_COUNT = 10368,  /* corners of the unrolled mask mesh: 3 per triangle */

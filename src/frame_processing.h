@@ -6,7 +6,7 @@
 
 namespace n3ds {
 
-constexpr uint32_t kMaxLandmarkCount = 165;
+constexpr uint32_t kMaxLandmarkCount = N3DS_LANDMARKS_165;
 
 // Landmark records and core output records of one frame call. About 30 kB, on the caller's stack: a
 // frame call of the engine object allocates nothing.

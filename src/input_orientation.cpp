@@ -153,7 +153,7 @@ int CNorvaleFaceShapeImp::TransformInputInfo(NSVL_OFFSCREEN* image, unsigned int
   }
   if (mirrored) {
     SwapPairs(kMirrorPairs, count, out.points);
-    if (count == 165) SwapPairs(kMirrorPairs165, count, out.points);
+    if (count == N3DS_LANDMARKS_165) SwapPairs(kMirrorPairs165, count, out.points);
   }
   return 1;
 }

@@ -24,7 +24,6 @@ static_assert(kVerticesPerTask * kMeshTasksPerFace == kVertexCount);
 constexpr int kBlock = 3 * kVerticesPerTask;
 
 constexpr float kProductUnit = 1.0f / 32768.0f;
-constexpr float kModelUnit = 0.00390625f;
 
 // sums[i] = sum of coefficients[k] * basis[k][first + i] over k in order, from 0.
 template <int kCount>

@@ -9,20 +9,15 @@
 
 namespace n3ds {
 
-const int32_t kRidgeVertexIndices[4] = {1335, 1366, 1443, 1513};
-const int32_t kMaskExtraVertexIndices[4] = {893, 979, 1335, 1366};
-
 namespace {
 
-constexpr int kPupilLandmark = 95;       // 95 and 96: the pupils, repeated as 101 and 102
-constexpr int kRidgeLandmark = 97;       // 97 to 100
-constexpr int kBaseLandmarkCount = 101;  // landmarks with a vertex of their own
+constexpr int kPupilLandmark = 95;  // 95 and 96: the pupils, repeated as 101 and 102
+constexpr int kRidgeLandmark = 97;  // 97 to 100
+// Landmarks with a vertex of their own.
+constexpr int kBaseLandmarkCount = N3DS_LANDMARKS_101;
 constexpr int kPupilRepeat = 101;
 constexpr int kBetweenOutline = 103;  // 103 to 120: midway between outline points
 constexpr int kBetweenRings = 121;    // 121 to 164: midway between points of the four rings
-
-// Middles of the upper and the lower lid, eye at image left, then at image right.
-constexpr int32_t kLidVertexIndices[2][2] = {{1154, 1054}, {893, 979}};
 
 // Share of the back-projected outline point; the rest is the model vertex. The detector's outline
 // is trusted round the chin, where it is a landmark of the skin and not of the silhouette.

@@ -15,14 +15,8 @@ struct Landmark3DInput {
   uint32_t landmark_count;   // 101 or 165
 };
 
-// Vertices that give landmarks 97 to 100 their depth. In rigid mode they are the four points of the
-// nose ridge that the landmarks lie on.
-extern const int32_t kRidgeVertexIndices[4];
-// In mask mode, on purpose, they start with the lid vertices of landmark 96, so that 97 and 98 lie
-// at the depth of an eye and 99 and 100 at that of the upper half of the ridge.
-extern const int32_t kMaskExtraVertexIndices[4];
-
-// Writes 3 floats per landmark in the model's frame, mm.
+// Writes 3 floats per landmark in the model's frame, mm. Landmarks 97 to 100 get their depth from
+// extra_vertices: kRidgeVertexIndices in rigid mode, kMaskExtraVertexIndices in mask mode.
 // Returns 0; -100 when the pose's rotation cannot be inverted: nothing is written then.
 int32_t ComputeLandmarks3D(const Landmark3DInput& input, const int32_t extra_vertices[4],
                            float* landmarks_3d);

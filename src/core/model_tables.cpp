@@ -11,6 +11,18 @@ const int32_t kInnerLandmarkVertexIndices[kInnerLandmarkCount] = {
 #include "inner_landmark_vertex_indices.inc"
 };
 
+const int32_t kLidVertexIndices[2][2] = {
+#include "lid_vertex_indices.inc"
+};
+
+const int32_t kRidgeVertexIndices[4] = {
+#include "ridge_vertex_indices.inc"
+};
+
+const int32_t kMaskExtraVertexIndices[4] = {
+#include "mask_extra_vertex_indices.inc"
+};
+
 const int32_t kContourCandidateVertexIndices[kContourCandidateCount] = {
 #include "contour_candidate_vertex_indices.inc"
 };

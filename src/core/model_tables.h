@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// The engine's constant tables. Their values stand in data/, one file a table.
+// The engine's constant tables. Their values are in data/, one file per table.
 #pragma once
 
 #include <array>
@@ -9,6 +9,9 @@
 #include "norvale_3d_sticker_engine.h"
 
 namespace n3ds {
+
+// Millimetres per unit of the model's 16-bit coordinates, which have 8 fractional bits.
+constexpr float kModelUnit = 1.0f / 256.0f;
 
 constexpr int kVertexCount = N3DS_VERTEX_COUNT;
 constexpr int kShapeSize = 3 * kVertexCount;  // coordinates of a shape: x, y, z per vertex
@@ -24,6 +27,13 @@ constexpr int kContourCandidateCount = 534;
 extern const int32_t kDefaultContourVertexIndices[kOutlineLandmarkCount];
 // Vertex of each inner landmark; entry 0 belongs to landmark 19.
 extern const int32_t kInnerLandmarkVertexIndices[kInnerLandmarkCount];
+// Vertices of landmarks 95 and 96: the middles of the upper and the lower lid of each eye.
+extern const int32_t kLidVertexIndices[2][2];
+// Vertices of landmarks 97 to 100.
+extern const int32_t kRidgeVertexIndices[4];
+// The same in mask mode, where they start with the lid vertices of landmark 96: 97 and 98 lie at
+// the depth of an eye, 99 and 100 at that of the upper half of the ridge.
+extern const int32_t kMaskExtraVertexIndices[4];
 // Vertices where the silhouette can arise, ascending; the position is the candidate number.
 extern const int32_t kContourCandidateVertexIndices[kContourCandidateCount];
 

@@ -16,8 +16,6 @@
 
 namespace n3ds {
 
-constexpr float kModelStep = 0.00390625f;  // 1/256 mm
-
 struct Vector3 {
   float x, y, z;
 };
@@ -63,13 +61,13 @@ void ProjectBasis(const int16_t* basis, int count, int32_t vertex,
                   const Vector3* const (&directions)[kRows], float* const (&rows)[kRows]) {
   for (int k = 0; k < count; ++k) {
     const Vector3 component = VertexOf(basis + static_cast<ptrdiff_t>(k) * kShapeSize, vertex);
-    for (int r = 0; r < kRows; ++r) rows[r][k] = Dot(*directions[r], component) * kModelStep;
+    for (int r = 0; r < kRows; ++r) rows[r][k] = Dot(*directions[r], component) * kModelUnit;
   }
 }
 
 // What the equation asks of the coefficients once the mean shape has had its part.
 inline float RightHandSide(const ProjectionEquation& equation, const Vector3& mean) {
-  return -Dot(equation.direction, mean) * kModelStep - equation.constant;
+  return -Dot(equation.direction, mean) * kModelUnit - equation.constant;
 }
 
 }  // namespace n3ds

@@ -66,9 +66,9 @@ void AddInteraction(const int16_t* tensor, const float* identity_coef,
         if ((stored[0] | stored[1] | stored[2]) == 0) continue;  // most of the tensor is zero
         const Vector3 interaction = VertexOf(block, landmark_vertices[i]);
         float* row = A + 2 * i * kExpressionCount + j;
-        row[0] += coefficient * (Dot(equations[i].x.direction, interaction) * kModelStep);
+        row[0] += coefficient * (Dot(equations[i].x.direction, interaction) * kModelUnit);
         row[kExpressionCount] +=
-            coefficient * (Dot(equations[i].y.direction, interaction) * kModelStep);
+            coefficient * (Dot(equations[i].y.direction, interaction) * kModelUnit);
       }
     }
   }
@@ -121,7 +121,7 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
       ProjectBasis<1>(identity_basis, kIdentityCount, vertex, {&depth}, {depth_row});
     }
     for (int k = 0; k < kIdentityCount; ++k) depth_row[k] *= depth_weight;
-    b[depth_index] = depth_weight * (point[2] - Dot(depth, mean) * kModelStep - translation[2]);
+    b[depth_index] = depth_weight * (point[2] - Dot(depth, mean) * kModelUnit - translation[2]);
   }
   Substitute(A.get(), b.get(), kIdentityCount);
 

@@ -15,7 +15,6 @@ namespace n3ds {
 
 namespace {
 
-constexpr float kModelUnit = 0.00390625f;  // mm per unit of the model's fixed-point coordinates
 constexpr int kFastWorkerFaces = 4;  // from this many faces on, rigid mode uses the fast worker
 
 // The frame's landmarks and what stands to the workers' disposal, in memory of the frame.
@@ -32,7 +31,8 @@ MRESULT CheckFrame(const TrackingContext& context, const N3DS_LANDMARK* faces, i
   for (int32_t k = 0; k < face_count; k++) {
     if (faces[k].points == nullptr) return N3DS_NULL_ARGUMENT;
     const uint32_t count = faces[k].count;
-    if ((count != 101 && count != 165) || count != faces[0].count) return N3DS_BAD_VALUE;
+    if ((count != N3DS_LANDMARKS_101 && count != N3DS_LANDMARKS_165) || count != faces[0].count)
+      return N3DS_BAD_VALUE;
   }
   return N3DS_OK;
 }

@@ -107,7 +107,7 @@ inline std::vector<double> ModelShape(const std::vector<double>& identity = {},
 inline std::vector<float> MeanShapeFloats() {
   std::vector<float> shape(kShapeSize);
   for (size_t i = 0; i < shape.size(); i++) {
-    shape[i] = static_cast<float>(ModelInt16(kMeanOffset, i)) * 0.00390625f;
+    shape[i] = static_cast<float>(ModelInt16(kMeanOffset, i)) * kModelUnit;
   }
   return shape;
 }
@@ -171,9 +171,10 @@ inline std::vector<Vec3> LandmarkPoints(const std::vector<double>& shape, int co
   std::vector<Vec3> points;
   for (const int32_t v : kDefaultContourVertexIndices) points.push_back(VertexOf(shape, v));
   for (const int32_t v : kInnerLandmarkVertexIndices) points.push_back(VertexOf(shape, v));
-  points.push_back(Middle(VertexOf(shape, 1154), VertexOf(shape, 1054)));
-  points.push_back(Middle(VertexOf(shape, 893), VertexOf(shape, 979)));
-  for (const int32_t v : {1335, 1366, 1443, 1513}) points.push_back(VertexOf(shape, v));
+  for (const auto& lids : kLidVertexIndices) {
+    points.push_back(Middle(VertexOf(shape, lids[0]), VertexOf(shape, lids[1])));
+  }
+  for (const int32_t v : kRidgeVertexIndices) points.push_back(VertexOf(shape, v));
   if (count == 101) return points;
   points.push_back(points[95]);
   points.push_back(points[96]);

@@ -44,6 +44,13 @@ TEST(LandmarkTables, InnerLandmarksHaveTheirVertices) {
                                 1656, 1649, 1730, 1728, 1716, 1703, 1684, 1801, 1762, 1750}));
 }
 
+TEST(LandmarkTables, PupilsAndRidgeHaveTheirVertices) {
+  EXPECT_THAT(Values(kLidVertexIndices[0]), ElementsAreArray({1154, 1054}));
+  EXPECT_THAT(Values(kLidVertexIndices[1]), ElementsAreArray({893, 979}));
+  EXPECT_THAT(Values(kRidgeVertexIndices), ElementsAreArray({1335, 1366, 1443, 1513}));
+  EXPECT_THAT(Values(kMaskExtraVertexIndices), ElementsAreArray({893, 979, 1335, 1366}));
+}
+
 TEST(LandmarkTables, EveryLandmarkHasAVertexOfItsOwn) {
   std::set<int32_t> vertices(std::begin(kDefaultContourVertexIndices),
                              std::end(kDefaultContourVertexIndices));
