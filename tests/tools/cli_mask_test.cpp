@@ -181,7 +181,7 @@ TEST_F(CliMask, OddPicturesStayOdd) {
     const Picture masked = Masked(Save("photo.png", photo), track, texture, {"--format", format});
     ASSERT_EQ(masked.width, 241);
     ASSERT_EQ(masked.height, 161);
-    // The face is cut by the border; the warp itself leaves out the last row and column.
+    // The face reaches beyond the right and the lower border.
     EXPECT_GT(At(masked, 239, 80)[1], 90) << format;
     EXPECT_GT(At(masked, 205, 159)[0], 60) << format;
     EXPECT_EQ(At(masked, 0, 0), (Rgb{50, 50, 50})) << format;
