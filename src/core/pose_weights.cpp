@@ -30,23 +30,25 @@ double Distance(const Point& a, const Point& b) {
 }
 
 struct Normal {
-  double x;
-  double y;
+  float x;
+  float y;
 };
 
 // Normal of the line through two points, not of unit length.
 Normal LineNormal(const Point& a, const Point& b) {
   const int32_t dx = WrapSubtract(a.x, b.x);
   const int32_t dy = WrapSubtract(a.y, b.y);
-  if (dx == 0) return {1.0, 0.0};
-  if (dy == 0) return {0.0, 1.0};
-  return {static_cast<double>(dy) / dx, -1.0};
+  if (dx == 0) return {1.0f, 0.0f};
+  if (dy == 0) return {0.0f, 1.0f};
+  return {static_cast<float>(dy) / static_cast<float>(dx), -1.0f};
 }
 
+// Rounding can put the cosine of parallel lines above 1; their angle is then NaN.
 double AngleInDegrees(const Normal& a, const Normal& b) {
-  const double dot = std::fabs(a.x * b.x + a.y * b.y);
-  const double lengths = std::sqrt((a.x * a.x + a.y * a.y) * (b.x * b.x + b.y * b.y));
-  const auto cosine = static_cast<float>(dot / lengths);
+  const float dot = std::fabs(a.x * b.x + a.y * b.y);
+  const float squared_lengths = (a.x * a.x + a.y * a.y) * (b.x * b.x + b.y * b.y);
+  const auto cosine = static_cast<float>(static_cast<double>(dot) /
+                                         std::sqrt(static_cast<double>(squared_lengths)));
   return std::acos(static_cast<double>(cosine)) * 180.0 / 3.14159;
 }
 

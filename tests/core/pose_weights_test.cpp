@@ -222,6 +222,29 @@ TEST(PoseWeights, UprightAndLevelLinesHaveNormalsOfTheirOwn) {
                   .SwitchedOff());
 }
 
+TEST(PoseWeights, TheAngleOfParallelLinesIsFormedFromSinglePrecisionNormals) {
+  // A nose line from (0, 0) to (48, 35), a mouth at right angles to it, and an eye line to try.
+  const auto cleared = [](int32_t eye_dx, int32_t eye_dy) {
+    return Face()
+        .Put(68, 0, 0)
+        .Put(69, 0, 0)
+        .Put(75, 13, 83)
+        .Put(81, 83, -13)
+        .Put(9, 96, 70)
+        .Put(39, -100, 0)
+        .Put(57, 100, 0)
+        .Put(42, 0, -100)
+        .Put(48, 0, -100)
+        .Put(54, eye_dx, -100 + eye_dy)
+        .Put(60, eye_dx, -100 + eye_dy)
+        .SwitchedOff();
+  };
+  EXPECT_FALSE(cleared(-35, 48));  // at right angles
+  EXPECT_TRUE(cleared(48, 35));    // parallel: the angle is 0
+  EXPECT_TRUE(cleared(60, 43));
+  EXPECT_FALSE(cleared(59, 43));  // parallel but for rounding: the cosine exceeds 1
+}
+
 TEST(PoseWeights, AZeroMouthWidthLeavesEverything) {
   const PoseWeights weights = Face().Put(81, -3000, 5000).Weigh(Untouched());
   EXPECT_EQ(weights.mouth_open, kOldFlag);
@@ -310,10 +333,10 @@ void ReferenceWeights(const int32_t* p, PoseWeights* out) {
     return std::sqrt(dx * dx + dy * dy);
   };
   const auto normal = [](Pair a, Pair b) {
-    if (a.first == b.first) return std::pair<double, double>{1, 0};
-    if (a.second == b.second) return std::pair<double, double>{0, 1};
-    return std::pair<double, double>{
-        static_cast<double>(a.second - b.second) / static_cast<double>(a.first - b.first), -1};
+    if (a.first == b.first) return std::pair<float, float>{1.0f, 0.0f};
+    if (a.second == b.second) return std::pair<float, float>{0.0f, 1.0f};
+    return std::pair<float, float>{
+        static_cast<float>(a.second - b.second) / static_cast<float>(a.first - b.first), -1.0f};
   };
   const double tiny = 1e-6;
 
@@ -355,10 +378,11 @@ void ReferenceWeights(const int32_t* p, PoseWeights* out) {
 
   const auto na = normal(middle(at(42), at(48)), middle(at(54), at(60)));
   const auto nb = normal(mouth, base);
-  const double dot = std::fabs(na.first * nb.first + na.second * nb.second);
-  const double root = std::sqrt((na.first * na.first + na.second * na.second) *
-                                (nb.first * nb.first + nb.second * nb.second));
-  const float cosine = static_cast<float>(dot / root);
+  const float dot = std::fabs(na.first * nb.first + na.second * nb.second);
+  const float squared =
+      (na.first * na.first + na.second * na.second) * (nb.first * nb.first + nb.second * nb.second);
+  const auto cosine =
+      static_cast<float>(static_cast<double>(dot) / std::sqrt(static_cast<double>(squared)));
   if (std::acos(static_cast<double>(cosine)) * 180.0 / 3.14159 < 75) out->weighting_switch = 0;
 }
 
