@@ -173,7 +173,14 @@ void WriteOutputs(const MaskFaceTask& task, const PoseRounds& rounds) {
     std::memcpy(out, rounds.rotation() + 3 * static_cast<ptrdiff_t>(row), 3 * sizeof(float));
     out[3] = rounds.translation()[row];
   }
-  WriteModelViewAndProjection(rounds.rotation(), rounds.translation(), task.camera, task.result);
+  // Built apart and copied: for an image one pixel wide, which has no projection, zeros are
+  // reported and not the projection of an earlier frame.
+  float model_view[16] = {};
+  float projection[16] = {};
+  WriteModelViewAndProjection(rounds.rotation(), rounds.translation(), task.camera, model_view,
+                              projection);
+  std::memcpy(ModelViewOf(task.result), model_view, sizeof(model_view));
+  std::memcpy(task.result->projectionMatrix, projection, sizeof(projection));
 }
 
 }  // namespace

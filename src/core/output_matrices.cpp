@@ -24,7 +24,7 @@ int32_t SolveForModelViewMatrix(const float* rotation, const float* translation,
 int32_t SolveForProjectionMatrix(const float* camera, int32_t width, int32_t height, float near,
                                  float far, float* out) {
   if (camera == nullptr || out == nullptr) return N3DS_NULL_ARGUMENT;
-  // Negated, so that a plane that is not a number is refused too.
+  // Negated, so that a NaN plane is refused too.
   if (width < 1 || height < 1 || !(near > 0.0f && near < far)) return N3DS_BAD_VALUE;
   const auto w = static_cast<float>(width);
   const auto h = static_cast<float>(height);
@@ -41,26 +41,26 @@ int32_t SolveForProjectionMatrix(const float* camera, int32_t width, int32_t hei
 }
 
 void WriteModelViewAndProjection(const float* rotation, const float* translation,
-                                 const float* camera, N3DS_RIGID_MATRIX* result) {
+                                 const float* camera, float* model_view, float* projection) {
   const int32_t width = WrapMultiply(2, TruncateToInt32(camera[2]));
   const int32_t height = WrapMultiply(2, TruncateToInt32(camera[5]));
-  SolveForModelViewMatrix(rotation, translation, result->modelMatrix);
-  SolveForProjectionMatrix(camera, width, height, kNearPlane, kFarPlane, result->projectionMatrix);
+  SolveForModelViewMatrix(rotation, translation, model_view);
+  SolveForProjectionMatrix(camera, width, height, kNearPlane, kFarPlane, projection);
 }
 
 void SplitModelView(const N3DS_RIGID_MATRIX& result, N3DS_RIGID_MATRIX* out) {
-  std::memcpy(out->modelMatrix, result.modelMatrix, sizeof(out->modelMatrix));
+  std::memcpy(out->modelMatrix, ModelViewOf(result), sizeof(out->modelMatrix));
   std::memcpy(out->projectionMatrix, result.projectionMatrix, sizeof(out->projectionMatrix));
   const float view[16] = {1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, 0, 0, -kViewDistance, 1};
   std::memcpy(out->viewMatrix, view, sizeof(view));
-  for (int column = 0; column < 4; column++) {
+  for (int column = 0; column < 4; ++column) {
     float* c = out->modelMatrix + 4 * static_cast<ptrdiff_t>(column);
     c[2] += kViewDistance * c[3];
   }
 }
 
 void TiltRotation(const float* rotation, float* tilted) {
-  for (int row = 0; row < 3; row++) {
+  for (int row = 0; row < 3; ++row) {
     const float e1 = rotation[3 * row];
     const float e2 = rotation[3 * row + 1];
     const float e3 = rotation[3 * row + 2];

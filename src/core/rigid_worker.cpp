@@ -73,7 +73,8 @@ void FinishFace(const RigidFaceTask& task, const PoseRounds& rounds) {
   std::memcpy(task.poseRef, task.pose, kPoseSize * sizeof(float));
   float tilted[9];
   TiltRotation(rounds.rotation(), tilted);
-  WriteModelViewAndProjection(tilted, rounds.translation(), task.camera, task.result);
+  WriteModelViewAndProjection(tilted, rounds.translation(), task.camera, ModelViewOf(task.result),
+                              task.result->projectionMatrix);
 }
 
 void RefineShape(const RigidFaceTask& task, const PoseWeights& weights, PoseRounds* rounds) {

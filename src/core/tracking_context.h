@@ -16,8 +16,7 @@ constexpr int kPoseSize = 7;  // qw, qx, qy, qz, tx, ty, tz
 // every per-slot array holds the track of the frame's face k.
 struct TrackingContext {
   MHandle memory;                             // of every allocation of the core
-  N3DS_RIGID_MATRIX rigidResult[kSlotCount];  // model-view in modelMatrix, and projection; the
-                                              // other members are not used here
+  N3DS_RIGID_MATRIX rigidResult[kSlotCount];  // ModelViewOf() and projection; the rest is unused
   uint32_t landmarkNum;                       // latched by the first frame with a face; 0 before it
   float camera[9];                            // camera matrix of the last frame
   float maskPose[kSlotCount][12];             // mask mode: [R | t], row by row

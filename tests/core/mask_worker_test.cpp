@@ -518,6 +518,23 @@ TEST(MaskWorker, BrowsDoNotDriveTheIdentityOfATrackedFace) {
 
 // ---- Outputs
 
+TEST(MaskWorker, ABrowInTheCameraPlaneKeepsItsObservedPosition) {
+  const Points landmarks = FrontalFace();
+  Face face;
+  face.Run(landmarks);
+  // An unturned pose that puts the vertex of landmark 19 at depth 0. The pose fits fail at such a
+  // point and leave the pose, and blending it with itself changes nothing.
+  const int32_t vertex = n3ds::kInnerLandmarkVertexIndices[0];
+  const float pose[7] = {1, 0, 0, 0, 0, 0, -MeanShape()[static_cast<size_t>(3 * vertex + 2)]};
+  std::copy_n(pose, 7, face.state.pose);
+  std::copy_n(pose, 7, face.state.pose_ref);
+  std::fill(std::begin(face.state.identity), std::end(face.state.identity), 0.0f);
+  face.Run(landmarks);
+  ASSERT_EQ(Bits(face.state.pose), Bits(pose));
+  EXPECT_FALSE(AllZero(face.state.identity)) << "the identity was fitted";
+  for (const float coefficient : face.state.identity) EXPECT_TRUE(std::isfinite(coefficient));
+}
+
 TEST(MaskWorker, WritesPoseMatrixModelViewAndProjection) {
   Face face;
   for (float& element : face.result.viewMatrix) element = 5.0f;
@@ -552,6 +569,16 @@ TEST(MaskWorker, OddPictureSizesCountOnePixelLessInTheProjection) {
 }
 
 // ---- Input that cannot be fitted
+
+TEST(MaskWorker, AnImageOfOnePixelHasNoProjection) {
+  Face face;
+  face.Run(FrontalFace());
+  ASSERT_NE(face.result.projectionMatrix[0], 0.0f);
+  face.camera = Camera(1, 1);
+  face.Run(FrontalFace());
+  for (const float element : face.result.projectionMatrix) EXPECT_EQ(element, 0.0f);
+  EXPECT_EQ(face.result.modelMatrix[15], 1.0f);
+}
 
 TEST(MaskWorker, AllLandmarksOnOnePixelEndInFiniteOutputs) {
   for (const int32_t where : {0, 300}) {

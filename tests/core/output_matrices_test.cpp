@@ -128,7 +128,7 @@ TEST(OutputMatrices, ProjectEveryPointToItsPixel) {
     for (int i = 0; i < 9; i++) r[i] = static_cast<float>(pose.r[i]);
     for (int i = 0; i < 3; i++) t[i] = static_cast<float>(pose.t[i]);
     N3DS_RIGID_MATRIX result = {};
-    WriteModelViewAndProjection(r, t, camera.k, &result);
+    WriteModelViewAndProjection(r, t, camera.k, result.modelMatrix, result.projectionMatrix);
     const testing::Vec3 p = {random.In(-90, 90), random.In(-90, 90), random.In(-90, 90)};
     double u, v;
     Project(pose, p, width, height, &u, &v);
@@ -146,7 +146,7 @@ TEST(OutputMatrices, AnOddPictureLosesItsLastColumnAndRow) {
   ASSERT_EQ(camera.k[2], 320.5f);
   const float t[3] = {0, 0, 1};
   N3DS_RIGID_MATRIX result = {};
-  WriteModelViewAndProjection(kIdentity, t, camera.k, &result);
+  WriteModelViewAndProjection(kIdentity, t, camera.k, result.modelMatrix, result.projectionMatrix);
   float expected[16];
   ASSERT_EQ(SolveForProjectionMatrix(camera.k, 640, 480, 1.0f, 5000.0f, expected), N3DS_OK);
   EXPECT_EQ(Bits(result.projectionMatrix), Bits(expected));
@@ -157,7 +157,7 @@ TEST(OutputMatrices, APictureOfOnePixelKeepsTheProjectionBefore) {
   const float t[3] = {0, 0, 1};
   N3DS_RIGID_MATRIX result = {};
   std::fill_n(result.projectionMatrix, 16, 5.0f);
-  WriteModelViewAndProjection(kIdentity, t, camera.k, &result);
+  WriteModelViewAndProjection(kIdentity, t, camera.k, result.modelMatrix, result.projectionMatrix);
   EXPECT_THAT(result.projectionMatrix, Each(5.0f));
   EXPECT_EQ(result.modelMatrix[14], -1.0f);
 }
@@ -166,7 +166,7 @@ TEST(SplitModelView, MovesTheModelForwardAndTheViewBack) {
   N3DS_RIGID_MATRIX result = {};
   const float t[3] = {0, 0, 800};
   const Camera camera(640, 480);
-  WriteModelViewAndProjection(kIdentity, t, camera.k, &result);
+  WriteModelViewAndProjection(kIdentity, t, camera.k, result.modelMatrix, result.projectionMatrix);
   float landmarks[3] = {1, 2, 3};
   N3DS_RIGID_MATRIX out = {};
   out.landmarks3D = landmarks;
