@@ -1,120 +1,48 @@
 // SPDX-License-Identifier: MIT
-// From the delivered picture's landmarks to the upright, unmirrored ones.
+// From the delivered image's landmarks to the upright, unmirrored ones.
+#include <algorithm>
+#include <utility>
+
 #include "math/integer_arithmetic.h"
 #include "norvale_face_shape_imp.h"
 
 namespace {
 
-struct LandmarkPair {
-  uint8_t a;
-  uint8_t b;
+// Landmarks k and sum - k change places in a mirror, for k from first to last.
+struct MirrorRun {
+  int first, last, sum;
 };
 
-// Landmarks that change places in a mirror. The rest lie on the middle line: 9, 78, 84, 89, 93 and
-// 97 to 100.
-constexpr LandmarkPair kMirrorPairs[] = {
-    // outline
-    {0, 18},
-    {1, 17},
-    {2, 16},
-    {3, 15},
-    {4, 14},
-    {5, 13},
-    {6, 12},
-    {7, 11},
-    {8, 10},
-    // brows
-    {19, 34},
-    {20, 33},
-    {21, 32},
-    {22, 31},
-    {23, 30},
-    {24, 29},  //
-    {25, 38},
-    {26, 37},
-    {27, 36},
-    {28, 35},
-    // eyes
-    {39, 57},
-    {40, 56},
-    {41, 55},
-    {42, 54},
-    {43, 53},
-    {44, 52},  //
-    {45, 51},
-    {46, 62},
-    {47, 61},
-    {48, 60},
-    {49, 59},
-    {50, 58},
-    // nose
-    {63, 74},
-    {64, 73},
-    {65, 72},
-    {66, 71},
-    {67, 70},
-    {68, 69},
-    // lips
-    {75, 81},
-    {76, 80},
-    {77, 79},
-    {82, 86},
-    {83, 85},  //
-    {87, 91},
-    {88, 90},
-    {92, 94},
-    // pupils
-    {95, 96},
+// The other landmarks lie on the midline: 9, 78, 84, 89, 93 and 97 to 100.
+// clang-format off
+constexpr MirrorRun kMirrorRuns[] = {
+    { 0,  8,  18},                // outline
+    {19, 24,  53}, {25, 28,  63}, // brows
+    {39, 45,  96}, {46, 50, 108}, // eyes
+    {63, 68, 137},                // nose
+    {75, 77, 156}, {82, 83, 168}, // outer lip
+    {87, 88, 178}, {92, 92, 186}, // inner lip
+    {95, 95, 191},                // pupils
 };
 
-// The further pairs of the 165-point layout.
-constexpr LandmarkPair kMirrorPairs165[] = {
-    // pupils again
-    {101, 102},
-    // between outline points
-    {103, 120},
-    {104, 119},
-    {105, 118},
-    {106, 117},
-    {107, 116},  //
-    {108, 115},
-    {109, 114},
-    {110, 113},
-    {111, 112},
-    // between eye points
-    {121, 138},
-    {122, 137},
-    {123, 136},
-    {124, 135},
-    {125, 134},
-    {126, 133},  //
-    {127, 144},
-    {128, 143},
-    {129, 142},
-    {130, 141},
-    {131, 140},
-    {132, 139},
-    // between lip points
-    {145, 150},
-    {146, 149},
-    {147, 148},
-    {151, 156},
-    {152, 155},
-    {153, 154},  //
-    {157, 160},
-    {158, 159},
-    {161, 164},
-    {162, 163},
+// The landmarks that only the 165-point layout has.
+constexpr MirrorRun kMirrorRuns165[] = {
+    {101, 101, 203},                  // pupils again
+    {103, 111, 223},                  // between outline points
+    {121, 126, 259}, {127, 132, 271}, // between eye points
+    {145, 147, 295}, {151, 153, 307}, // between outer-lip points
+    {157, 158, 317}, {161, 162, 325}, // between inner-lip points
 };
+// clang-format on
 
 template <size_t kCount>
-void SwapPairs(const LandmarkPair (&pairs)[kCount], unsigned int count, int32_t* points) {
-  for (const LandmarkPair& pair : pairs) {
-    if (pair.a >= count || pair.b >= count) continue;
-    for (int axis = 0; axis < 2; axis++) {
-      const int32_t kept = points[2 * pair.a + axis];
-      points[2 * pair.a + axis] = points[2 * pair.b + axis];
-      points[2 * pair.b + axis] = kept;
+void SwapPairs(const MirrorRun (&runs)[kCount], unsigned int count, int32_t* points) {
+  for (const MirrorRun& run : runs) {
+    for (int k = run.first; k <= run.last; ++k) {
+      const int partner = run.sum - k;
+      if (static_cast<unsigned int>(std::max(k, partner)) >= count) continue;
+      std::swap(points[2 * k], points[2 * partner]);
+      std::swap(points[2 * k + 1], points[2 * partner + 1]);
     }
   }
 }
@@ -127,7 +55,7 @@ int CNorvaleFaceShapeImp::TransformInputInfo(NSVL_OFFSCREEN* image, unsigned int
   const int32_t width = image->width;
   const int32_t height = image->height;
   const bool mirrored = mirror == 1;
-  for (unsigned int i = 0; i < count; i++) {
+  for (unsigned int i = 0; i < count; ++i) {
     // The full width and height, not one less: column 0 maps to column `width`.
     const int32_t x = mirrored ? n3ds::WrapSubtract(width, points[i].x) : points[i].x;
     const int32_t y = points[i].y;
@@ -145,15 +73,15 @@ int CNorvaleFaceShapeImp::TransformInputInfo(NSVL_OFFSCREEN* image, unsigned int
         to[0] = y;
         to[1] = n3ds::WrapSubtract(width, x);
         break;
-      default:  // 180, and whatever else a host passes
+      default:  // 180 and every other value
         to[0] = n3ds::WrapSubtract(width, x);
         to[1] = n3ds::WrapSubtract(height, y);
         break;
     }
   }
   if (mirrored) {
-    SwapPairs(kMirrorPairs, count, out.points);
-    if (count == N3DS_LANDMARKS_165) SwapPairs(kMirrorPairs165, count, out.points);
+    SwapPairs(kMirrorRuns, count, out.points);
+    if (count == N3DS_LANDMARKS_165) SwapPairs(kMirrorRuns165, count, out.points);
   }
   return 1;
 }
