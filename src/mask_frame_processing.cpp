@@ -2,14 +2,14 @@
 // Mask frames: tracking, dense meshes, and the meshes unrolled for the renderer.
 #include <cstring>
 
-#include "frame_processing.h"
+#include "frame_records.h"
 #include "norvale_face_shape_imp.h"
 
 namespace {
 
 // One face's mesh as a plain triangle list: every corner carries a position of its own.
 void UnrollMesh(const N3DS_3D_MODEL& model, float* corners) {
-  for (int i = 0; i < N3DS_MASK_CORNER_COUNT; i++) {
+  for (int i = 0; i < N3DS_MASK_CORNER_COUNT; ++i) {
     const float* vertex = model.vertices + 3 * static_cast<ptrdiff_t>(model.triangles[i]);
     std::memcpy(corners + 3 * static_cast<ptrdiff_t>(i), vertex, 3 * sizeof(float));
   }
@@ -38,7 +38,7 @@ MRESULT CNorvaleFaceShapeImp::ProcessFaceMask(NSVL_OFFSCREEN* image, unsigned in
 
   n3ds::ReportMatrices(records, nFaces, nLandmarks, matrices);
   models->modelNum = nFaces;
-  for (unsigned int k = 0; k < nFaces; k++) {
+  for (unsigned int k = 0; k < nFaces; ++k) {
     UnrollMesh(meshes[k], maskVertices[k]);
     models->models[k] = {maskVertices[k], N3DS_MASK_CORNER_COUNT, maskTexCoords,
                          N3DS_MASK_CORNER_COUNT};

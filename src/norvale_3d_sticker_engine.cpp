@@ -10,7 +10,7 @@ CNorvaleFaceShapeImp* EngineOf(void* engine) { return static_cast<CNorvaleFaceSh
 
 }  // namespace
 
-void* Norvale_3DSticker_CreateEngine(void) { return new CNorvaleFaceShapeImp(); }
+void* Norvale_3DSticker_CreateEngine(void) { return new CNorvaleFaceShapeImp; }
 
 void Norvale_3DSticker_DestroyEngine(void* engine) {
   if (engine == nullptr) return;

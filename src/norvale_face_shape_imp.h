@@ -1,21 +1,31 @@
 // SPDX-License-Identifier: MIT
 // The object behind the exported engine handle: owns the tracking core, the model's bytes, the
 // orientation of the input and the output memory of mask mode.
+//
+// Its members are defined in norvale_face_shape_imp.cpp (initialisation, release, version),
+// input_orientation.cpp, frame_processing.cpp (rigid frames) and mask_frame_processing.cpp.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
 
-#include "frame_processing.h"
 #include "norvale_3d_sticker_core.h"
+
+namespace n3ds {
+struct FrameRecords;
+}
 
 class CNorvaleFaceShapeImp {
  public:
+  CNorvaleFaceShapeImp() = default;
+  CNorvaleFaceShapeImp(const CNorvaleFaceShapeImp&) = delete;
+  CNorvaleFaceShapeImp& operator=(const CNorvaleFaceShapeImp&) = delete;
+
   // Engine results as Norvale_3DSticker_* documents them.
   MRESULT Initialize(const char* path, unsigned int degree, unsigned int mirror);
   MRESULT InitializeEx(const unsigned char* data, unsigned int size, unsigned int degree,
                        unsigned int mirror);
-  // Always 0. (The name is spelled as hosts of older versions know it from crash reports.)
+  // Always 0. The spelling is part of the interface.
   MRESULT UnInitalize();
   void SetDegreeAndMirror(unsigned int degree, unsigned int mirror);
   static const Norvale_3DSticker_Version* GetVersion();
@@ -28,9 +38,9 @@ class CNorvaleFaceShapeImp {
                           Norvale_3DSticker_Matrix_Array* matrices,
                           Norvale_3DSticker_ModelInfo_Array* models);
 
-  // Maps one face's landmarks from the delivered picture to the upright, unmirrored one, and
-  // renumbers them when mirrored. `image` is the delivered picture. Returns nonzero; 0, with
-  // nothing written, when points or image are null or count is 0.
+  // Maps one face's landmarks from the delivered image to the upright, unmirrored one, and
+  // renumbers them when mirrored. `image` is the delivered image. Returns nonzero; 0, with nothing
+  // written, when points or image are null or count is 0.
   int TransformInputInfo(NSVL_OFFSCREEN* image, unsigned int count, __tag_point* points,
                          N3DS_LANDMARK& out) const;
 
@@ -42,17 +52,19 @@ class CNorvaleFaceShapeImp {
                                     int32_t nFaces);
 
   // First half of a frame call, the same in both modes: maps the landmarks and runs a driver.
-  // Returns 0, or 1 for whatever went wrong.
+  // Returns 0, or 1 for any failure.
   MRESULT TrackFrame(BuildFunction build, NSVL_OFFSCREEN* image, unsigned int nFaces,
                      unsigned int nLandmarks, __tag_point* points,
                      n3ds::FrameRecords* records) const;
-  // Ends an initialisation: takes the orientation over, or returns to the uninitialised state.
+  // Ends an initialisation: stores the orientation, or returns to the uninitialised state.
   MRESULT FinishInitialize(MRESULT result, unsigned int degree, unsigned int mirror);
 
-  uint32_t degree;       // clockwise turn of the delivered picture
-  uint32_t mirror;       // 1: mirrored
-  void* core;            // null while uninitialised
-  uint8_t* modelBuffer;  // the model's bytes; null while uninitialised
-  float maskVertices[N3DS_FACE_CAPACITY][kMaskVertexFloats];
-  float maskTexCoords[kMaskTextureFloats];
+  uint32_t degree = 0;   // clockwise rotation of the delivered image
+  uint32_t mirror = 0;   // 1: mirrored
+  void* core = nullptr;  // null while uninitialised
+  // The model file's bytes; null while uninitialised. The core unpacks them into arrays of its own
+  // and does not read them again; the engine keeps them for as long as it is initialised.
+  uint8_t* modelBuffer = nullptr;
+  float maskVertices[N3DS_FACE_CAPACITY][kMaskVertexFloats] = {};
+  float maskTexCoords[kMaskTextureFloats] = {};
 };

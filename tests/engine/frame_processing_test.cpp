@@ -4,9 +4,12 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <cstdint>
+#include <type_traits>
 #include <vector>
 
 #include "engine/engine_testing.h"
+#include "frame_records.h"
 
 namespace n3ds::testing {
 namespace {
@@ -83,6 +86,17 @@ TEST(RigidFrame, BadFramesFailAndLeaveTheOutputUntouched) {
             N3DS_FAILED);
   EXPECT_TRUE(out.Untouched());
   EXPECT_EQ(ProcessCounts(*engine, &points, 1, 101, &out), N3DS_OK);
+}
+
+TEST(FrameRecords, HoldTheLandmarksOfBothLayoutsAndNoMore) {
+  EXPECT_TRUE(FrameRecords::Holds(N3DS_LANDMARKS_101));
+  EXPECT_TRUE(FrameRecords::Holds(N3DS_LANDMARKS_165));
+  EXPECT_FALSE(FrameRecords::Holds(166));
+  EXPECT_FALSE(FrameRecords::Holds(UINT32_MAX));
+  static_assert(sizeof(FrameRecords::points[0]) == 2 * 165 * sizeof(int32_t));
+  static_assert(sizeof(FrameRecords::landmarks_3d[0]) == 3 * 165 * sizeof(float));
+  static_assert(!std::is_copy_constructible_v<FrameRecords> &&
+                !std::is_copy_assignable_v<FrameRecords>);
 }
 
 TEST(RigidFrame, ARefusedFrameLeavesTheTracks) {
