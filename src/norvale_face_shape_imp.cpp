@@ -10,6 +10,14 @@
 
 namespace {
 
+struct VersionTexts {
+  char version[32];
+  char date[16];
+  char notice[48];
+};
+constexpr VersionTexts kVersionTexts = {"Norvale_3DSticker_1.1.12021.63", "06/19/2018",
+                                        "Norvale 3-D sticker engine, version 1.1"};
+
 // Reads a whole file into memory of the system heap, which the caller frees. Returns 0; 1 when the
 // file cannot be read; -201.
 MRESULT ReadFile(const char* path, uint8_t** bytes, size_t* size) {
@@ -18,12 +26,12 @@ MRESULT ReadFile(const char* path, uint8_t** bytes, size_t* size) {
   MRESULT result = N3DS_FAILED;
   long length = -1;
   if (std::fseek(file, 0, SEEK_END) == 0) length = std::ftell(file);
-  // A directory can be opened, but on some file systems its end lies at the largest number.
+  // A directory can be opened, but some file systems report the largest number as its end.
   const bool has_end = length >= 0 && length < std::numeric_limits<long>::max();
   if (has_end && std::fseek(file, 0, SEEK_SET) == 0) {
     *size = static_cast<size_t>(length);
-    // One byte at least: an empty file is read, and the loader says what it thinks of it; a
-    // directory without a size shows here that it cannot be read.
+    // At least one byte: an empty file is read, for the loader to refuse; a directory of size zero
+    // fails here.
     const size_t capacity = *size > 0 ? *size : 1;
     *bytes = static_cast<uint8_t*>(std::malloc(capacity));
     if (*bytes == nullptr) {
@@ -94,19 +102,13 @@ void CNorvaleFaceShapeImp::SetDegreeAndMirror(unsigned int new_degree, unsigned 
 }
 
 const Norvale_3DSticker_Version* CNorvaleFaceShapeImp::GetVersion() {
-  static char version_text[64];
-  static char build_date[32];
-  static char notice[128];
-  static Norvale_3DSticker_Version version;
-  version.major = 1;
-  version.minor = 1;
-  version.build = 12021;
-  version.revision = 63;
-  std::strcpy(version_text, "Norvale_3DSticker_1.1.12021.63");
-  std::strcpy(build_date, "06/19/2018");
-  std::snprintf(notice, sizeof(notice), "Norvale 3-D sticker engine, version %d.%d", 1, 1);
-  version.versionText = version_text;
-  version.buildDate = build_date;
-  version.notice = notice;
+  static VersionTexts texts = kVersionTexts;
+  static constexpr Norvale_3DSticker_Version kVersion = {
+      1, 1, 12021, 63, texts.version, texts.date, texts.notice};
+  static Norvale_3DSticker_Version version = kVersion;
+  // Restores what a host has written into, and writes nothing otherwise: calls from several threads
+  // do not race.
+  if (std::memcmp(&texts, &kVersionTexts, sizeof(texts)) != 0) texts = kVersionTexts;
+  if (std::memcmp(&version, &kVersion, sizeof(version)) != 0) version = kVersion;
   return &version;
 }

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdlib>
+#include <memory>
 #include <vector>
 
 #include "engine/engine_testing.h"
@@ -108,6 +109,25 @@ TEST_P(EngineAllocation, WithoutMemoryForTheContextTheProcessStops) {
 
 INSTANTIATE_TEST_SUITE_P(, EngineAllocation, ::testing::Values(FromFile, FromMemory),
                          [](const auto& source) { return source.index == 0 ? "File" : "Memory"; });
+
+TEST_P(EngineAllocation, DestroyingAnInitialisedEngineReleasesEverything) {
+  ModelBytes();
+  const FailingHeap heap;
+  auto engine = std::make_unique<Engine>();
+  ASSERT_EQ(GetParam()(*engine), N3DS_OK);
+  ASSERT_EQ(blocks, 6);
+  engine.reset();
+  EXPECT_EQ(blocks, 0);
+}
+
+TEST(CoreAllocation, LoadingAgainReleasesTheModelBefore) {
+  ModelBytes();
+  const FailingHeap heap;
+  const auto core = Core::Ready();
+  ASSERT_EQ(blocks, 5);
+  ASSERT_EQ(N3DS_LoadFaceHouse(core->handle(), ModelBytes().data(), ModelBytes().size()), N3DS_OK);
+  EXPECT_EQ(blocks, 5);
+}
 
 TEST(EngineFrames, AFrameOfTheEngineTakesNothingOfItsOwn) {
   // A frame without faces takes nothing at all: all else is the core's and given back.

@@ -5,7 +5,10 @@
 
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
+#include <iterator>
 #include <string>
+#include <type_traits>
 #include <vector>
 
 #include "core/model_tables.h"
@@ -82,6 +85,9 @@ TEST(EngineInterface, ANullEngineIsItsOwnResultOrNoEffect) {
   Norvale_3DSticker_DestroyEngine(nullptr);
   EXPECT_TRUE(out.Untouched());
 }
+
+static_assert(!std::is_copy_constructible_v<CNorvaleFaceShapeImp> &&
+              !std::is_copy_assignable_v<CNorvaleFaceShapeImp>);
 
 TEST(EngineInterface, ANewEngineIsAllZero) {
   const Engine engine;
@@ -182,6 +188,23 @@ TEST(EngineInterface, AModelWithOtherCountsIsRefused) {
   }
 }
 
+size_t OpenDescriptors() {
+  const std::filesystem::directory_iterator descriptors("/proc/self/fd");
+  return static_cast<size_t>(std::distance(begin(descriptors), end(descriptors)));
+}
+
+TEST(EngineInterface, TheModelFileIsClosedAgain) {
+  const Engine engine;
+  const std::vector<uint8_t> wrong_size(10);
+  const size_t before = OpenDescriptors();
+  EXPECT_EQ(engine.Initialize(), N3DS_OK);
+  EXPECT_EQ(OpenDescriptors(), before);
+  EXPECT_EQ(Norvale_3DSticker_Uninitialize(engine.handle()), N3DS_OK);
+  EXPECT_EQ(InitializeFrom(engine, wrong_size), N3DS_BAD_VALUE);
+  EXPECT_EQ(Norvale_3DSticker_Initialize(engine.handle(), "/proc", 0, 0), N3DS_FAILED);
+  EXPECT_EQ(OpenDescriptors(), before);
+}
+
 TEST(EngineInterface, NullDataOrSizeZeroIsRefused) {
   const Engine engine;
   const auto init = Norvale_3DSticker_InitializeEx;
@@ -273,13 +296,19 @@ TEST(EngineInterface, VersionIsTheSameRecordOnEveryCall) {
   EXPECT_EQ(version->versionText, text);
 }
 
-TEST(EngineInterface, VersionIsRewrittenByEachCall) {
+TEST(EngineInterface, EachCallRestoresAVersionRecordThatWasWrittenTo) {
   auto* version = const_cast<Norvale_3DSticker_Version*>(Norvale_3DSticker_GetVersion());
-  version->major = 99;
-  const_cast<char*>(version->versionText)[0] = 'X';
+  const std::string date = version->buildDate, notice = version->notice;
+  const Norvale_3DSticker_Version before = *version;
+  for (const char* text : {before.versionText, before.buildDate, before.notice}) {
+    std::memset(const_cast<char*>(text), 'X', std::strlen(text) + 1);
+  }
+  *version = {99, 98, 97, 96, nullptr, nullptr, nullptr};
   Norvale_3DSticker_GetVersion();
-  EXPECT_EQ(version->major, 1);
+  EXPECT_EQ(std::memcmp(version, &before, sizeof(before)), 0);
   EXPECT_STREQ(version->versionText, "Norvale_3DSticker_1.1.12021.63");
+  EXPECT_EQ(version->buildDate, date);
+  EXPECT_EQ(version->notice, notice);
 }
 
 }  // namespace

@@ -67,5 +67,19 @@ TEST(ParallelEngines, AnEngineMayMoveBetweenThreads) {
   }
 }
 
+TEST(ParallelEngines, TheVersionMayBeAskedForByManyThreadsAtOnce) {
+  std::vector<std::thread> threads;
+  for (int i = 0; i < kEngines; i++) {
+    threads.emplace_back([] {
+      for (int call = 0; call < 100; call++) {
+        const Norvale_3DSticker_Version* version = Norvale_3DSticker_GetVersion();
+        EXPECT_EQ(version->build, 12021);
+        EXPECT_STREQ(version->versionText, "Norvale_3DSticker_1.1.12021.63");
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+}
+
 }  // namespace
 }  // namespace n3ds::testing
