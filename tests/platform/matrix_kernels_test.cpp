@@ -15,10 +15,11 @@ using testing::GuardedArray;
 using testing::RandomValues;
 using testing::SameBits;
 
+// No compiler of ours lacks it, though it is no part of the language.
+__extension__ typedef __int128 Int128;
+
 // Low 32 bits of a result that was computed without overflow.
-int32_t Low32(__int128 value) {
-  return static_cast<int32_t>(static_cast<uint32_t>(static_cast<unsigned __int128>(value)));
-}
+int32_t Low32(Int128 value) { return static_cast<int32_t>(static_cast<uint32_t>(value)); }
 
 struct Sizes {
   int m;
@@ -75,11 +76,11 @@ TEST(MatrixElementKernels, IntegerFormsWrapOnRandomSizes) {
     GuardedArray<int32_t> dst(count);
     const int32_t s = random.Integers<int32_t>(1)[0];
     ASSERT_EQ(mcvMatrixAddMatrix_s32(dst.data(), a.data(), b.data(), rows, cols), 0);
-    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(__int128{a[i]} + b[i]));
+    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(Int128{a[i]} + b[i]));
     ASSERT_EQ(mcvMatrixSubMatrix_s32(dst.data(), a.data(), b.data(), rows, cols), 0);
-    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(__int128{a[i]} - b[i]));
+    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(Int128{a[i]} - b[i]));
     ASSERT_EQ(mcvMatrixMulScalar_s32(dst.data(), a.data(), s, rows, cols), 0);
-    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(__int128{a[i]} * s));
+    for (size_t i = 0; i < count; ++i) ASSERT_EQ(dst[i], Low32(Int128{a[i]} * s));
   }
 }
 
@@ -133,8 +134,8 @@ TEST(MatrixProducts, IntegerRowMajorWrapsOnRandomSizes) {
               0);
     for (int i = 0; i < size.m; ++i) {
       for (int j = 0; j < size.n; ++j) {
-        __int128 sum = 0;
-        for (int p = 0; p < size.k; ++p) sum += __int128{A[i * size.k + p]} * B[p * size.n + j];
+        Int128 sum = 0;
+        for (int p = 0; p < size.k; ++p) sum += Int128{A[i * size.k + p]} * B[p * size.n + j];
         ASSERT_EQ(C[i * size.n + j], Low32(sum));
       }
     }
@@ -155,7 +156,7 @@ TEST(MatrixProducts, WideSumsTakeProductsOf32Bits) {
       for (int j = 0; j < size.n; ++j) {
         int64_t sum = 0;
         for (int p = 0; p < size.k; ++p) {
-          sum += Low32(__int128{A[i * size.k + p]} * B[p * size.n + j]);
+          sum += Low32(Int128{A[i * size.k + p]} * B[p * size.n + j]);
         }
         ASSERT_EQ(C[i * size.n + j], sum);
       }
@@ -186,10 +187,10 @@ TEST(MatrixProducts, ColumnMajorFormsOnRandomSizes) {
     for (int i = 0; i < size.m; ++i) {
       for (int j = 0; j < size.n; ++j) {
         float sum = 0.0f;
-        __int128 integer_sum = 0;
+        Int128 integer_sum = 0;
         for (int p = 0; p < size.k; ++p) {
           sum = std::fma(A[p * size.m + i], B[j * size.k + p], sum);
-          integer_sum += __int128{Ai[p * size.m + i]} * Bi[j * size.k + p];
+          integer_sum += Int128{Ai[p * size.m + i]} * Bi[j * size.k + p];
         }
         ASSERT_TRUE(SameBits(C[j * size.m + i], sum));
         ASSERT_EQ(Ci[j * size.m + i], Low32(integer_sum));
@@ -219,10 +220,10 @@ TEST(MatrixProducts, MultiplyAddFormsAddAfterTheProduct) {
     for (int i = 0; i < size.m; ++i) {
       for (int j = 0; j < size.n; ++j) {
         float sum = 0.0f;
-        __int128 integer_sum = Ei[i * size.n + j];
+        Int128 integer_sum = Ei[i * size.n + j];
         for (int p = 0; p < size.k; ++p) {
           sum = std::fma(A[i * size.k + p], B[p * size.n + j], sum);
-          integer_sum += __int128{Ai[i * size.k + p]} * Bi[p * size.n + j];
+          integer_sum += Int128{Ai[i * size.k + p]} * Bi[p * size.n + j];
         }
         ASSERT_TRUE(SameBits(D[i * size.n + j], sum + E[i * size.n + j]));
         ASSERT_EQ(Di[i * size.n + j], Low32(integer_sum));

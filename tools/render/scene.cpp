@@ -334,7 +334,8 @@ void Scene::DrawLandmarks(const FaceResult& face) const {
   SetMatrices(dots_, face, face.model);
   // In proportion to the face, so that lids and lips stay apart: 150 mm is a head's breadth.
   const double depth = -ModelView(face)[14];
-  const double breadth = 150 / depth * face.projection[0] / 2 * target_.width();
+  const double breadth =
+      150 / depth * static_cast<double>(face.projection[0]) / 2 * target_.width();
   glUniform1f(dots_.Uniform("size"), static_cast<float>(std::clamp(0.018 * breadth, 1.5, 6.0)));
   glBindVertexArray(dot_array_);
   glBindBuffer(GL_ARRAY_BUFFER, dot_buffer_);
