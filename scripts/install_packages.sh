@@ -19,7 +19,7 @@ packages_of() {
       echo 'libgles-dev            # OpenGL ES 3, draws the stickers'
       echo 'libgl1-mesa-dri        # its software renderer, for machines without a GPU'
       echo 'libpng-dev             # reads and writes PNG'
-      echo 'libjpeg62-turbo-dev    # reads photos'
+      echo 'libjpeg-dev            # reads and writes JPEG'
       echo 'ffmpeg                 # encodes MP4'
       ;;
     test)
@@ -31,7 +31,9 @@ packages_of() {
       echo 'clang                  # the second compiler'
       echo 'clang-format           # formatting'
       echo 'clang-tidy             # static analysis'
-      echo 'gcovr                  # branch coverage'
+      echo 'gcovr                  # coverage of lines and branches'
+      echo 'shellcheck             # static analysis of the scripts'
+      echo 'flake8                 # static analysis of the Python programs'
       ;;
     arm64)
       echo 'g++-aarch64-linux-gnu  # cross compiler'
@@ -60,6 +62,7 @@ install_missing_packages() {
   for group in "$@"; do
     packages=$(packages_of "$group") || return 1
     while read -r package _; do
+      if [[ " ${missing[*]} " == *" $package "* ]]; then continue; fi
       if [ "$(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null)" != installed ]; then
         missing+=("$package")
       fi
