@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <utility>
 
-#include "math/integer_arithmetic.h"
 #include "norvale_face_shape_imp.h"
+#include "platform/integer_arithmetic.h"
 
 namespace {
 

@@ -6,7 +6,7 @@
 #include "core/convex_hull.h"
 #include "core/model_tables.h"
 #include "core/nearest_candidate.h"
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 #include "platform/scratch_array.h"
 
 namespace n3ds {

@@ -3,8 +3,8 @@
 
 #include <cmath>
 
-#include "math/integer_arithmetic.h"
 #include "norvale_3d_sticker_core.h"
+#include "platform/integer_arithmetic.h"
 
 #if !defined(N3DS_DISABLE_SIMD) && defined(__x86_64__)
 #include <emmintrin.h>

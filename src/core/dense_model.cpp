@@ -9,7 +9,7 @@
 #include "core/landmarks_3d.h"
 #include "core/shape_sums.h"
 #include "core/tracking_context.h"
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 #include "platform/scratch_array.h"
 
 namespace n3ds {

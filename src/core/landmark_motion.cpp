@@ -5,7 +5,7 @@
 #include <initializer_list>
 
 #include "core/model_tables.h"
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 

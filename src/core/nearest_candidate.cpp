@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <cstddef>
 
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 

@@ -3,7 +3,7 @@
 
 #include <cstring>
 
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 

@@ -4,8 +4,8 @@
 #include <algorithm>
 #include <cmath>
 
-#include "math/integer_arithmetic.h"
 #include "norvale_3d_sticker_core.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 

@@ -11,7 +11,7 @@
 #include "core/rigid_pose_smoothing.h"
 #include "core/rigid_shape_refinement.h"
 #include "core/tracking_context.h"
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "core/shape_sums.h"
 
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 #if !defined(N3DS_DISABLE_SIMD) && defined(__x86_64__)
 #include <immintrin.h>

@@ -6,8 +6,8 @@
 
 #include "core/tracking_context.h"
 #include "mask/warp_face.h"
-#include "math/integer_arithmetic.h"
 #include "norvale_3d_sticker_core.h"
+#include "platform/integer_arithmetic.h"
 
 namespace {
 

@@ -9,7 +9,7 @@
 
 #include "core/model_tables.h"
 #include "mask/pixel_lanes.h"
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 namespace {

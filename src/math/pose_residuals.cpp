@@ -6,7 +6,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "math/integer_arithmetic.h"
+#include "platform/integer_arithmetic.h"
 #include "platform/scratch_array.h"
 
 namespace n3ds {

@@ -6,8 +6,8 @@
 #include <cstdint>
 #include <cstring>
 
-#include "math/integer_arithmetic.h"
 #include "norvale_3d_sticker_core.h"
+#include "platform/integer_arithmetic.h"
 
 namespace {
 
