@@ -5,14 +5,7 @@
 
 #include "norvale_3d_sticker_core.h"
 #include "platform/integer_arithmetic.h"
-
-#if !defined(N3DS_DISABLE_SIMD) && defined(__x86_64__)
-#include <emmintrin.h>
-#define N3DS_VECTOR_HULL 1
-#elif !defined(N3DS_DISABLE_SIMD) && defined(__aarch64__)
-#include <arm_neon.h>
-#define N3DS_VECTOR_HULL 1
-#endif
+#include "platform/simd.h"
 
 namespace n3ds {
 
@@ -46,61 +39,7 @@ constexpr double kStraightScore = 0.996;
 
 double Difference(float a, float b) { return static_cast<double>(a - b); }
 
-#if N3DS_VECTOR_HULL
-
-constexpr int kLanes = 4;
-
-#if defined(__x86_64__)
-
-using Lanes = __m128;
-using Mask = __m128;
-
-// The directions from a point to the kLanes points from `to` on.
-inline void Directions(const HullPoint& from, const HullPoint* to, Lanes* x, Lanes* y) {
-  const auto* p = reinterpret_cast<const float*>(to);
-  const Lanes a = _mm_loadu_ps(p);                                    // x0 y0 .. x1
-  const Lanes b = _mm_loadu_ps(p + 4);                                // y1 .. x2 y2
-  const Lanes c = _mm_loadu_ps(p + 8);                                // .. x3 y3 ..
-  const Lanes y01 = _mm_shuffle_ps(a, b, _MM_SHUFFLE(0, 0, 1, 1));    // y0 y0 y1 y1
-  const Lanes xy23 = _mm_shuffle_ps(b, c, _MM_SHUFFLE(2, 1, 3, 2));   // x2 y2 x3 y3
-  const Lanes xs = _mm_shuffle_ps(a, xy23, _MM_SHUFFLE(2, 0, 3, 0));  // x0 x1 x2 x3
-  const Lanes ys = _mm_shuffle_ps(y01, xy23, _MM_SHUFFLE(3, 1, 2, 0));
-  *x = _mm_cvtepi32_ps(_mm_sub_epi32(_mm_castps_si128(xs), _mm_set1_epi32(from.x)));
-  *y = _mm_cvtepi32_ps(_mm_sub_epi32(_mm_castps_si128(ys), _mm_set1_epi32(from.y)));
-}
-inline Lanes Add(Lanes a, Lanes b) { return _mm_add_ps(a, b); }
-inline Lanes Multiply(Lanes a, Lanes b) { return _mm_mul_ps(a, b); }
-inline Lanes Multiply(Lanes a, float b) { return _mm_mul_ps(a, _mm_set1_ps(b)); }
-inline Lanes Abs(Lanes a) { return _mm_andnot_ps(_mm_set1_ps(-0.0f), a); }
-inline Mask NotBelow(Lanes a, Lanes b) { return _mm_cmpge_ps(a, b); }
-inline Mask Above(Lanes a, Lanes b) { return _mm_cmpgt_ps(a, b); }
-// The first lane where both hold; kLanes if there is none.
-inline int FirstOfBoth(Mask a, Mask b) {
-  return __builtin_ctz(static_cast<unsigned>(_mm_movemask_ps(_mm_and_ps(a, b))) | 1u << kLanes);
-}
-
-#else
-
-using Lanes = float32x4_t;
-using Mask = uint32x4_t;
-
-inline void Directions(const HullPoint& from, const HullPoint* to, Lanes* x, Lanes* y) {
-  const int32x4x3_t points = vld3q_s32(reinterpret_cast<const int32_t*>(to));
-  *x = vcvtq_f32_s32(vsubq_s32(points.val[0], vdupq_n_s32(from.x)));
-  *y = vcvtq_f32_s32(vsubq_s32(points.val[1], vdupq_n_s32(from.y)));
-}
-inline Lanes Add(Lanes a, Lanes b) { return vaddq_f32(a, b); }
-inline Lanes Multiply(Lanes a, Lanes b) { return vmulq_f32(a, b); }
-inline Lanes Multiply(Lanes a, float b) { return vmulq_n_f32(a, b); }
-inline Lanes Abs(Lanes a) { return vabsq_f32(a); }
-inline Mask NotBelow(Lanes a, Lanes b) { return vcgeq_f32(a, b); }
-inline Mask Above(Lanes a, Lanes b) { return vcgtq_f32(a, b); }
-inline int FirstOfBoth(Mask a, Mask b) {
-  const uint64_t bits = vget_lane_u64(vreinterpret_u64_u16(vmovn_u32(vandq_u32(a, b))), 0);
-  return bits == 0 ? kLanes : __builtin_ctzll(bits) / 16;
-}
-
-#endif
+constexpr int kLanes = 4;  // points tested at once
 
 // How far below the best score a point may be for the vector form to leave it to the exact test:
 // the tolerance, and some more for the rounding of this other way to compare.
@@ -111,28 +50,21 @@ constexpr float kSkipMargin = 4e-6f;
 int32_t SkipRejected(const HullPoint* points, int32_t j, int32_t count, const HullPoint& from,
                      const Direction& incoming, float incoming_squared, float best_score) {
   const float lowest_score = best_score - kSkipMargin;
+  const F32x4 incoming_x = F32x4::Splat(incoming.x), incoming_y = F32x4::Splat(incoming.y);
+  const I32x4 from_x = I32x4::Splat(from.x), from_y = I32x4::Splat(from.y);
   for (; j + kLanes <= count; j += kLanes) {
-    Lanes x, y;
-    Directions(from, points + j, &x, &y);
-    const Mask inner = NotBelow(Multiply(y, incoming.x), Multiply(x, incoming.y));
-    const Lanes dot = Add(Multiply(x, incoming.x), Multiply(y, incoming.y));
-    const Lanes lengths = Multiply(Add(Multiply(x, x), Multiply(y, y)), incoming_squared);
-    const Lanes signed_square = Multiply(dot, Abs(dot));
-    const Mask straight = Above(signed_square, Multiply(lengths, lowest_score));
-    const int lane = FirstOfBoth(inner, straight);
+    I32x4 to_x, to_y;
+    LoadFirstTwoOfThree(&points[j].x, &to_x, &to_y);
+    const F32x4 x = ToFloat(to_x - from_x), y = ToFloat(to_y - from_y);
+    const Mask32x4 inner = y * incoming_x >= x * incoming_y;
+    const F32x4 dot = x * incoming_x + y * incoming_y;
+    const F32x4 lengths = (x * x + y * y) * F32x4::Splat(incoming_squared);
+    const Mask32x4 straight = dot * Abs(dot) > lengths * F32x4::Splat(lowest_score);
+    const int lane = FirstTrue(inner & straight);
     if (lane < kLanes) return j + lane;
   }
   return j;
 }
-
-#else
-
-int32_t SkipRejected(const HullPoint*, int32_t j, int32_t, const HullPoint&, const Direction&,
-                     float, float) {
-  return j;
-}
-
-#endif
 
 }  // namespace
 

@@ -8,8 +8,8 @@
 #include <utility>
 
 #include "core/model_tables.h"
-#include "mask/pixel_lanes.h"
 #include "platform/integer_arithmetic.h"
+#include "platform/simd.h"
 
 namespace n3ds {
 namespace {
@@ -67,6 +67,11 @@ Point Project(const float* vertex, const float* K, const float* R, const float* 
   return {K[0] * xn + K[1] * yn + K[2], K[3] * xn + K[4] * yn + K[5]};
 }
 
+// left * (1 - t) + right * t, each product rounded.
+F32x4 Mix(F32x4 left, F32x4 right, float t) {
+  return left * F32x4::Splat(1.0f - t) + right * F32x4::Splat(t);
+}
+
 // The texture's colour at a position between pixel (itx, ity) and its neighbours to the right and
 // below, blended. The weights leave 0..1 only in textures of two pixels, where the result is
 // clamped.
@@ -74,12 +79,12 @@ void SampleTexture(const NSVL_OFFSCREEN& texture, int32_t itx, int32_t ity, floa
                    uint8_t* pixel) {
   const uint8_t* upper =
       texture.plane[0] + static_cast<int64_t>(ity) * texture.pitch[0] + int64_t{4} * itx;
-  PixelLanes left, right;
-  LoadPixelPair(upper, &left, &right);
-  const PixelLanes top = Mix(left, 1.0f - fx, right, fx);
-  LoadPixelPair(upper + texture.pitch[0], &left, &right);
-  const PixelLanes bottom = Mix(left, 1.0f - fx, right, fx);
-  StorePixel(Mix(top, 1.0f - fy, bottom, fy), pixel);
+  F32x4 left, right;  // a pixel, its channels as lanes
+  LoadBytes(upper, &left, &right);
+  const F32x4 top = Mix(left, right, fx);
+  LoadBytes(upper + texture.pitch[0], &left, &right);
+  const F32x4 bottom = Mix(left, right, fx);
+  StoreBytes(Mix(top, bottom, fy), pixel);
 }
 
 // One triangle of the output, filled from one triangle of the texture.

@@ -4,10 +4,10 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
-#include <cstring>
 
 #include "platform/integer_arithmetic.h"
 #include "platform/scratch_array.h"
+#include "platform/simd.h"
 
 namespace n3ds {
 namespace {
@@ -19,11 +19,10 @@ static_assert(static_cast<double>(kZeroDepth) < 1e-6);
 // Weight of a landmark that is neither eye corner nor nose, when the weighting is on.
 constexpr float kOrdinaryFactor = 0.1f;
 
-// Landmarks that define the middle line.
+// Landmarks that define the midline.
 constexpr int32_t kChin = 9;
 constexpr int32_t kInnerEyeCornerLeft = 45;
 constexpr int32_t kInnerEyeCornerRight = 51;
-constexpr int32_t kLastOutlineLandmark = 18;
 
 // Landmarks are classed by their number in the arrays as passed; those beyond are ordinary.
 constexpr int32_t kClassifiedLandmarks = 95;
@@ -33,7 +32,6 @@ enum LandmarkGroup : uint8_t { kOrdinary, kEyeCorner, kNoseLeft, kNoseRight };
 struct LandmarkClass {
   LandmarkGroup group = kOrdinary;
   bool moves_with_speech = false;
-  bool outline = false;  // temple or cheek: may be damped to its distance across the middle line
 };
 
 struct LandmarkClasses {
@@ -47,55 +45,34 @@ struct LandmarkClasses {
     for (int i = 75; i <= 76; ++i) of[i].moves_with_speech = true;  // mouth
     for (int i = 80; i <= 88; ++i) of[i].moves_with_speech = true;
     for (int i = 90; i <= 94; ++i) of[i].moves_with_speech = true;
-    for (const int i : {0, 1, 2, 3, 15, 16, 17, 18}) of[i].outline = true;
   }
 };
 
 constexpr LandmarkClasses kClasses;
 
-// Points are worked on in blocks of four, a vector per quantity and a lane per point: one algorithm
-// on every processor. Lanes never mix, so the results are those of one point at a time.
+// Points are worked on in blocks of four, a vector per quantity and a lane per point. Lanes never
+// mix, so the results are those of one point at a time.
 constexpr int32_t kBlock = 4;
-using Lanes __attribute__((vector_size(kBlock * sizeof(float)))) = float;
 
-Lanes Splat(float value) { return Lanes{value, value, value, value}; }
-
-Lanes LoadLanes(const float* values) {
-  Lanes lanes;
-  std::memcpy(&lanes, values, sizeof(lanes));
-  return lanes;
-}
-
-void StoreLanes(float* values, Lanes lanes) { std::memcpy(values, &lanes, sizeof(lanes)); }
-
-// Four rows of four become four columns.
-struct Quad {
-  Lanes row[kBlock];
-};
-Quad Transpose(Lanes a, Lanes b, Lanes c, Lanes d) {
-  const Lanes ac_low = __builtin_shufflevector(a, c, 0, 4, 1, 5);
-  const Lanes ac_high = __builtin_shufflevector(a, c, 2, 6, 3, 7);
-  const Lanes bd_low = __builtin_shufflevector(b, d, 0, 4, 1, 5);
-  const Lanes bd_high = __builtin_shufflevector(b, d, 2, 6, 3, 7);
-  return {{__builtin_shufflevector(ac_low, bd_low, 0, 4, 1, 5),
-           __builtin_shufflevector(ac_low, bd_low, 2, 6, 3, 7),
-           __builtin_shufflevector(ac_high, bd_high, 0, 4, 1, 5),
-           __builtin_shufflevector(ac_high, bd_high, 2, 6, 3, 7)}};
-}
-
+// 1 for temples and cheeks, landmarks 0 to 3 and 15 to 18: where the projection lies farther out
+// than the observation, only the distance across the midline counts. In whole blocks.
+constexpr float kMayCountAcross[] = {1, 1, 1, 1, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 1, 1, 1, 1, 0};
+constexpr int32_t kOutlineEnd = 19;
+static_assert(sizeof(kMayCountAcross) / sizeof(kMayCountAcross[0]) >= kOutlineEnd &&
+              sizeof(kMayCountAcross) / sizeof(kMayCountAcross[0]) % kBlock == 0);
 // g = J^T r, each entry summed in the order of the rows.
 void MultiplyTransposed(const float* J, const float* r, size_t rows, size_t columns, float* g) {
   if (columns == kPoseParameters) {
     // Columns 0 to 3 and 3 to 6; both compute column 3 alike.
-    Lanes low = Splat(0.0f), high = Splat(0.0f);
+    F32x4 low = F32x4::Splat(0.0f), high = F32x4::Splat(0.0f);
     for (size_t row = 0; row < rows; ++row) {
-      const Lanes residual = Splat(r[row]);
-      low += LoadLanes(J) * residual;
-      high += LoadLanes(J + 3) * residual;
+      const F32x4 residual = F32x4::Splat(r[row]);
+      low = low + F32x4::Load(J) * residual;
+      high = high + F32x4::Load(J + 3) * residual;
       J += kPoseParameters;
     }
-    StoreLanes(g, low);
-    StoreLanes(g + 3, high);
+    low.Store(g);
+    high.Store(g + 3);
     return;
   }
   std::fill_n(g, columns, 0.0f);
@@ -138,8 +115,8 @@ PoseResiduals::MiddleLine PoseResiduals::FindMiddleLine(const PoseProblem& probl
   const int32_t ax = TruncateToInt32(chin[0]);
   const int32_t ay = TruncateToInt32(chin[1]);
   const int32_t bx = TruncateToInt32(right[0] + left[0]) / 2;
-  // The x of one corner and the y of the other is what this weighting was tuned with. It tilts the
-  // line, but only decides which outline landmarks are damped and in which direction.
+  // The sum takes the x of one corner and the y of the other, which tilts the line. The line only
+  // decides which outline landmarks are damped and in which direction.
   const int32_t by = TruncateToInt32(right[0] + left[1] + 1.0f) / 2;
 
   if (bx == ax) {
@@ -161,78 +138,81 @@ PoseResiduals::MiddleLine PoseResiduals::FindMiddleLine(const PoseProblem& probl
   return line;
 }
 
-bool PoseResiduals::LiesInside(float u, float v, float ox, float oy) const {
+F32x4 PoseResiduals::DistanceFromMiddle(F32x4 x, F32x4 y) const {
   switch (middle_.kind) {
     case Middle::kNone:
-      return false;
+      break;
     case Middle::kVertical:
-      return std::fabs(ox - middle_.position) < std::fabs(u - middle_.position);
+      return Abs(x - F32x4::Splat(middle_.position));
     case Middle::kHorizontal:
-      return std::fabs(oy - middle_.position) < std::fabs(v - middle_.position);
+      return Abs(y - F32x4::Splat(middle_.position));
     case Middle::kOblique:
-      return std::fabs(middle_.slope * ox - oy + middle_.offset) <
-             std::fabs(middle_.slope * u - v + middle_.offset);
+      return Abs(F32x4::Splat(middle_.slope) * x - y + F32x4::Splat(middle_.offset));
   }
-  return false;
+  return F32x4::Splat(0.0f);
 }
 
-void PoseResiduals::ProjectAcross(float* along_u, float* along_v) const {
-  const float weight = problem_.contour_weight;
+void PoseResiduals::ProjectAcross(Mask32x4 across, F32x4* along_u, F32x4* along_v) const {
+  const F32x4 weight = F32x4::Splat(problem_.contour_weight);
+  const F32x4 normal = F32x4::Splat(middle_.normal);
+  F32x4 u = *along_u, v = *along_v;
   switch (middle_.kind) {
     case Middle::kNone:
       break;
     case Middle::kVertical:
       // The distance along the line is dropped and the one across it counted twice, which keeps the
       // landmark's share in the sum of squares.
-      *along_v = *along_u = weight * *along_u;
+      v = u = weight * u;
       break;
     case Middle::kHorizontal:
-      *along_u = *along_v = weight * *along_v;
+      u = v = weight * v;
       break;
     case Middle::kOblique:
-      *along_u = (*along_u + middle_.normal * *along_v) * weight / middle_.normal_squared;
-      *along_v = middle_.normal * *along_u;
+      u = (u + normal * v) * weight / F32x4::Splat(middle_.normal_squared);
+      v = normal * u;
       break;
   }
+  *along_u = Select(across, u, *along_u);
+  *along_v = Select(across, v, *along_v);
 }
 
 // A block of points; when fewer are left, the lanes beyond repeat the last one.
 struct PoseResiduals::Points {
-  Lanes X, Y, Z;       // in the model
-  Lanes xc, yc, zc;    // seen from the camera
-  Lanes fx_xc, fy_yc;  // times the focal lengths
-  Lanes u, v;          // projected
-  Lanes ox, oy;        // observed
-  Lanes group_factor, speech_factor;
+  F32x4 X, Y, Z;       // in the model
+  F32x4 xc, yc, zc;    // seen from the camera
+  F32x4 fx_xc, fy_yc;  // times the focal lengths
+  F32x4 u, v;          // projected
+  F32x4 ox, oy;        // observed
+  F32x4 group_factor, speech_factor;
 };
 
 // Derivatives of u and v by each parameter.
 struct PoseResiduals::Derivatives {
-  Lanes u[kPoseParameters], v[kPoseParameters];
+  F32x4 u[kPoseParameters], v[kPoseParameters];
 };
 
 // A pose and camera, spread over the lanes.
 struct PoseResiduals::View {
-  Lanes R[9];
-  Lanes w, x, y, z;
-  Lanes tx, ty, tz;
-  Lanes fx, fy, cx, cy;
+  F32x4 R[9];
+  F32x4 w, x, y, z;
+  F32x4 tx, ty, tz;
+  F32x4 fx, fy, cx, cy;
 
   View(const float* pose, const float* camera)
-      : w(Splat(pose[0])),
-        x(Splat(pose[1])),
-        y(Splat(pose[2])),
-        z(Splat(pose[3])),
-        tx(Splat(pose[4])),
-        ty(Splat(pose[5])),
-        tz(Splat(pose[6])),
-        fx(Splat(camera[0])),
-        fy(Splat(camera[4])),
-        cx(Splat(camera[2])),
-        cy(Splat(camera[5])) {
+      : w(F32x4::Splat(pose[0])),
+        x(F32x4::Splat(pose[1])),
+        y(F32x4::Splat(pose[2])),
+        z(F32x4::Splat(pose[3])),
+        tx(F32x4::Splat(pose[4])),
+        ty(F32x4::Splat(pose[5])),
+        tz(F32x4::Splat(pose[6])),
+        fx(F32x4::Splat(camera[0])),
+        fy(F32x4::Splat(camera[4])),
+        cx(F32x4::Splat(camera[2])),
+        cy(F32x4::Splat(camera[5])) {
     float matrix[9];
     QuatToRotationMatrix(pose, matrix);
-    for (int i = 0; i < 9; ++i) R[i] = Splat(matrix[i]);
+    for (int i = 0; i < 9; ++i) R[i] = F32x4::Splat(matrix[i]);
   }
 };
 
@@ -244,17 +224,17 @@ inline PoseResiduals::Points PoseResiduals::Project(const View& view, int32_t fi
   const float* m = problem_.model_points + 3 * static_cast<size_t>(first);
   const float* o = problem_.landmarks + 2 * static_cast<size_t>(first);
   Points p;
-  p.X = Lanes{m[0], m[3 * b], m[3 * c], m[3 * d]};
-  p.Y = Lanes{m[1], m[3 * b + 1], m[3 * c + 1], m[3 * d + 1]};
-  p.Z = Lanes{m[2], m[3 * b + 2], m[3 * c + 2], m[3 * d + 2]};
-  p.ox = Lanes{o[0], o[2 * b], o[2 * c], o[2 * d]};
-  p.oy = Lanes{o[1], o[2 * b + 1], o[2 * c + 1], o[2 * d + 1]};
+  p.X = F32x4::Of(m[0], m[3 * b], m[3 * c], m[3 * d]);
+  p.Y = F32x4::Of(m[1], m[3 * b + 1], m[3 * c + 1], m[3 * d + 1]);
+  p.Z = F32x4::Of(m[2], m[3 * b + 2], m[3 * c + 2], m[3 * d + 2]);
+  p.ox = F32x4::Of(o[0], o[2 * b], o[2 * c], o[2 * d]);
+  p.oy = F32x4::Of(o[1], o[2 * b + 1], o[2 * c + 1], o[2 * d + 1]);
   if (first < kClassifiedLandmarks) {
-    p.group_factor = LoadLanes(group_factor_ + first);
-    p.speech_factor = LoadLanes(speech_factor_ + first);
+    p.group_factor = F32x4::Load(group_factor_ + first);
+    p.speech_factor = F32x4::Load(speech_factor_ + first);
   } else {
-    p.group_factor = Splat(ordinary_factor_);
-    p.speech_factor = Splat(1.0f);
+    p.group_factor = F32x4::Splat(ordinary_factor_);
+    p.speech_factor = F32x4::Splat(1.0f);
   }
   p.xc = view.R[0] * p.X + view.R[1] * p.Y + view.R[2] * p.Z + view.tx;
   p.yc = view.R[3] * p.X + view.R[4] * p.Y + view.R[5] * p.Z + view.ty;
@@ -267,18 +247,18 @@ inline PoseResiduals::Points PoseResiduals::Project(const View& view, int32_t fi
 }
 
 inline PoseResiduals::Derivatives PoseResiduals::Differentiate(const View& view, const Points& p) {
-  const Lanes wX = view.w * p.X, wY = view.w * p.Y, wZ = view.w * p.Z;
-  const Lanes xX = view.x * p.X, xY = view.x * p.Y, xZ = view.x * p.Z;
-  const Lanes yX = view.y * p.X, yY = view.y * p.Y, yZ = view.y * p.Z;
-  const Lanes zX = view.z * p.X, zY = view.z * p.Y, zZ = view.z * p.Z;
+  const F32x4 wX = view.w * p.X, wY = view.w * p.Y, wZ = view.w * p.Z;
+  const F32x4 xX = view.x * p.X, xY = view.x * p.Y, xZ = view.x * p.Z;
+  const F32x4 yX = view.y * p.X, yY = view.y * p.Y, yZ = view.y * p.Z;
+  const F32x4 zX = view.z * p.X, zY = view.z * p.Y, zZ = view.z * p.Z;
   // Half the derivatives of xc, yc, zc by w, x, y, z. Some are the negatives of others, but summed
   // in another order.
-  const Lanes sum = xX + yY + zZ;
-  const Lanes a = wX - zY + yZ, b = zX + wY - xZ, c = xY - yX + wZ;
-  const Lanes xc_z = xZ - wY - zX, yc_x = yX - xY - wZ, zc_y = zY - wX - yZ;
+  const F32x4 sum = xX + yY + zZ;
+  const F32x4 a = wX - zY + yZ, b = zX + wY - xZ, c = xY - yX + wZ;
+  const F32x4 xc_z = xZ - wY - zX, yc_x = yX - xY - wZ, zc_y = zY - wX - yZ;
 
-  const Lanes twice_fx = view.fx + view.fx, twice_fy = view.fy + view.fy;
-  const Lanes xc = p.xc, yc = p.yc, zc = p.zc, zz = p.zc * p.zc, zero = Splat(0.0f);
+  const F32x4 twice_fx = view.fx + view.fx, twice_fy = view.fy + view.fy;
+  const F32x4 xc = p.xc, yc = p.yc, zc = p.zc, zz = p.zc * p.zc, zero = F32x4::Splat(0.0f);
   Derivatives d = {{twice_fx * (a * zc - xc * c) / zz, twice_fx * (sum * zc - xc * b) / zz,
                     twice_fx * (c * zc - xc * zc_y) / zz, twice_fx * (xc_z * zc - xc * sum) / zz,
                     view.fx / zc, zero, -p.fx_xc / zz},
@@ -296,117 +276,117 @@ template <bool kDerivatives>
 MRESULT PoseResiduals::EvaluatePoints(const float* pose, float* r, float* J, float* Jt) const {
   const View view(pose, problem_.camera);
   for (int32_t first = 0; first < problem_.point_count; first += kBlock) {
-    const int32_t count = std::min(kBlock, problem_.point_count - first);
-    const Points p = Project(view, first, count);
-    const auto zero = (p.zc <= Splat(kZeroDepth)) & (p.zc >= Splat(-kZeroDepth));
-    if ((zero[0] | zero[1] | zero[2] | zero[3]) != 0) {
-      std::puts("zero in zc");
-      return N3DS_NUMERICAL;
-    }
+    const int32_t wanted = std::min(kBlock, problem_.point_count - first);
+    const Points p = Project(view, first, wanted);
+    // The points before one without depth are still written.
+    const int32_t without_depth = FirstTrue(Abs(p.zc) <= F32x4::Splat(kZeroDepth));
+    const int32_t count = std::min(wanted, without_depth);
 
-    Lanes ru = (p.u - p.ox) * p.group_factor * p.speech_factor;
-    Lanes rv = (p.v - p.oy) * p.group_factor * p.speech_factor;
-    bool across[kBlock] = {};
-    if (first <= kLastOutlineLandmark) {
-      for (int32_t l = 0; l < count; ++l) {
-        across[l] = kClasses.of[first + l].outline && LiesInside(p.u[l], p.v[l], p.ox[l], p.oy[l]);
-        if (!across[l]) continue;
-        float along_u = ru[l], along_v = rv[l];
-        ProjectAcross(&along_u, &along_v);
-        ru[l] = along_u;
-        rv[l] = along_v;
-      }
-    }
-    float* residuals = r + 2 * static_cast<size_t>(first);
-    if (count == kBlock) {
-      StoreLanes(residuals, __builtin_shufflevector(ru, rv, 0, 4, 1, 5));
-      StoreLanes(residuals + 4, __builtin_shufflevector(ru, rv, 2, 6, 3, 7));
-    } else {
-      for (int32_t l = 0; l < count; ++l) {
-        residuals[2 * l] = ru[l];
-        residuals[2 * l + 1] = rv[l];
-      }
-    }
+    const Mask32x4 across = first < kOutlineEnd ? AcrossOf(p, first) : Mask32x4{};
+    const bool any_across = first < kOutlineEnd && Any(across);
+    F32x4 ru = (p.u - p.ox) * p.group_factor * p.speech_factor;
+    F32x4 rv = (p.v - p.oy) * p.group_factor * p.speech_factor;
+    if (any_across) ProjectAcross(across, &ru, &rv);
+    StorePairs(ru, rv, count, r + 2 * static_cast<size_t>(first));
 
     if constexpr (kDerivatives) {
       Derivatives d = Differentiate(view, p);
-      if (first <= kLastOutlineLandmark) {
-        for (int32_t l = 0; l < count; ++l) {
-          if (!across[l]) continue;
-          for (int32_t k = 0; k < kPoseParameters; ++k) {
-            float along_u = d.u[k][l], along_v = d.v[k][l];
-            ProjectAcross(&along_u, &along_v);
-            d.u[k][l] = along_u;
-            d.v[k][l] = along_v;
-          }
-        }
+      if (any_across) {
+        for (int32_t k = 0; k < kPoseParameters; ++k) ProjectAcross(across, &d.u[k], &d.v[k]);
       }
-      Store(d, first, count, J, Jt);
-      if (problem_.parameter_count > kPoseParameters) {
-        WeightOtherColumns(p, across, first, count, J, Jt);
-      }
+      StoreDerivatives(d, first, count, J, Jt);
+      WeightOtherColumns(p, any_across ? &across : nullptr, first, count, J, Jt);
+    }
+    if (count < wanted) {
+      std::puts("zero in zc");
+      return N3DS_NUMERICAL;
     }
   }
   return N3DS_OK;
 }
 
-inline void PoseResiduals::Store(const Derivatives& d, int32_t first, int32_t count, float* J,
-                                 float* Jt) const {
-  const size_t columns = static_cast<size_t>(problem_.parameter_count);
-  const size_t rows = 2 * static_cast<size_t>(problem_.point_count);
-  const size_t first_row = 2 * static_cast<size_t>(first);
-  float* row = J + first_row * columns;
-  if (columns == kPoseParameters && count == kBlock) {
-    // Columns 0 to 3 and 3 to 6 of each row; column 3 is written twice.
-    const Quad u_low = Transpose(d.u[0], d.u[1], d.u[2], d.u[3]);
-    const Quad u_high = Transpose(d.u[3], d.u[4], d.u[5], d.u[6]);
-    const Quad v_low = Transpose(d.v[0], d.v[1], d.v[2], d.v[3]);
-    const Quad v_high = Transpose(d.v[3], d.v[4], d.v[5], d.v[6]);
-    for (int32_t l = 0; l < kBlock; ++l) {
-      StoreLanes(row, u_low.row[l]);
-      StoreLanes(row + 3, u_high.row[l]);
-      StoreLanes(row + 7, v_low.row[l]);
-      StoreLanes(row + 10, v_high.row[l]);
-      row += 2 * kPoseParameters;
-    }
-    if (Jt == nullptr) return;
-    for (size_t k = 0; k < kPoseParameters; ++k) {
-      float* column = Jt + k * rows + first_row;
-      StoreLanes(column, __builtin_shufflevector(d.u[k], d.v[k], 0, 4, 1, 5));
-      StoreLanes(column + 4, __builtin_shufflevector(d.u[k], d.v[k], 2, 6, 3, 7));
-    }
+inline Mask32x4 PoseResiduals::AcrossOf(const Points& p, int32_t first) const {
+  return (F32x4::Load(kMayCountAcross + first) > F32x4::Splat(0.0f)) &
+         (DistanceFromMiddle(p.ox, p.oy) < DistanceFromMiddle(p.u, p.v));
+}
+
+inline void PoseResiduals::StorePairs(F32x4 u, F32x4 v, int32_t count, float* pairs) {
+  const F32x4 low = ZipLow(u, v), high = ZipHigh(u, v);
+  if (count == kBlock) {
+    low.Store(pairs);
+    high.Store(pairs + 4);
     return;
   }
-  const size_t known = std::min<size_t>(columns, kPoseParameters);
-  for (int32_t l = 0; l < count; ++l) {
-    for (size_t k = 0; k < known; ++k) {
-      const float along_u = d.u[k][l], along_v = d.v[k][l];
-      row[k] = along_u;
-      row[columns + k] = along_v;
-      if (Jt == nullptr) continue;
-      Jt[k * rows + first_row + 2 * static_cast<size_t>(l)] = along_u;
-      Jt[k * rows + first_row + 2 * static_cast<size_t>(l) + 1] = along_v;
-    }
-    row += 2 * columns;
+  float block[2 * kBlock];
+  low.Store(block);
+  high.Store(block + 4);
+  std::copy_n(block, 2 * count, pairs);
+}
+
+inline void PoseResiduals::StoreDerivatives(const Derivatives& d, int32_t first, int32_t count,
+                                            float* J, float* Jt) const {
+  const size_t columns = static_cast<size_t>(problem_.parameter_count);
+  if (columns != kPoseParameters) {
+    const size_t known = std::min<size_t>(columns, kPoseParameters);
+    for (size_t k = 0; k < known; ++k) StoreColumn(d.u[k], d.v[k], k, first, count, J, Jt);
+    return;
+  }
+  constexpr size_t kRowPair = 2 * kPoseParameters;
+  float part[kBlock * kRowPair];
+  float* const block = J + static_cast<size_t>(first) * kRowPair;
+  float* row = count == kBlock ? block : part;
+  // Columns 0 to 3 and 3 to 6 of each row; column 3 is written twice.
+  F32x4 u_low[] = {d.u[0], d.u[1], d.u[2], d.u[3]}, u_high[] = {d.u[3], d.u[4], d.u[5], d.u[6]};
+  F32x4 v_low[] = {d.v[0], d.v[1], d.v[2], d.v[3]}, v_high[] = {d.v[3], d.v[4], d.v[5], d.v[6]};
+  Transpose(u_low);
+  Transpose(u_high);
+  Transpose(v_low);
+  Transpose(v_high);
+  for (int32_t l = 0; l < kBlock; ++l) {
+    u_low[l].Store(row);
+    u_high[l].Store(row + 3);
+    v_low[l].Store(row + 7);
+    v_high[l].Store(row + 10);
+    row += kRowPair;
+  }
+  if (count < kBlock) std::copy_n(part, static_cast<size_t>(count) * kRowPair, block);
+
+  if (Jt == nullptr) return;
+  const size_t rows = 2 * static_cast<size_t>(problem_.point_count);
+  float* column = Jt + 2 * static_cast<size_t>(first);
+  for (size_t k = 0; k < kPoseParameters; ++k) {
+    StorePairs(d.u[k], d.v[k], count, column);
+    column += rows;
   }
 }
 
-void PoseResiduals::WeightOtherColumns(const Points& p, const bool* across, int32_t first,
+void PoseResiduals::WeightOtherColumns(const Points& p, const Mask32x4* across, int32_t first,
                                        int32_t count, float* J, float* Jt) const {
   const size_t columns = static_cast<size_t>(problem_.parameter_count);
-  const size_t rows = 2 * static_cast<size_t>(problem_.point_count);
-  for (int32_t l = 0; l < count; ++l) {
-    const size_t row = 2 * static_cast<size_t>(first + l);
-    for (size_t k = kPoseParameters; k < columns; ++k) {
-      float* along_u = J + row * columns + k;
-      float* along_v = along_u + columns;
-      *along_u = *along_u * p.group_factor[l] * p.speech_factor[l];
-      *along_v = *along_v * p.group_factor[l] * p.speech_factor[l];
-      if (across[l]) ProjectAcross(along_u, along_v);
-      if (Jt == nullptr) continue;
-      Jt[k * rows + row] = *along_u;
-      Jt[k * rows + row + 1] = *along_v;
+  const float* row = J + 2 * static_cast<size_t>(first) * columns;
+  for (size_t k = kPoseParameters; k < columns; ++k) {
+    float u[kBlock] = {}, v[kBlock] = {};
+    for (size_t l = 0; l < static_cast<size_t>(count); ++l) {
+      u[l] = row[2 * l * columns + k];
+      v[l] = row[(2 * l + 1) * columns + k];
     }
+    F32x4 along_u = F32x4::Load(u) * p.group_factor * p.speech_factor;
+    F32x4 along_v = F32x4::Load(v) * p.group_factor * p.speech_factor;
+    if (across != nullptr) ProjectAcross(*across, &along_u, &along_v);
+    StoreColumn(along_u, along_v, k, first, count, J, Jt);
+  }
+}
+
+void PoseResiduals::StoreColumn(F32x4 along_u, F32x4 along_v, size_t k, int32_t first,
+                                int32_t count, float* J, float* Jt) const {
+  const size_t columns = static_cast<size_t>(problem_.parameter_count);
+  const size_t rows = 2 * static_cast<size_t>(problem_.point_count);
+  const size_t first_row = 2 * static_cast<size_t>(first);
+  float pairs[2 * kBlock];
+  StorePairs(along_u, along_v, kBlock, pairs);
+  for (size_t i = 0; i < 2 * static_cast<size_t>(count); ++i) {
+    J[(first_row + i) * columns + k] = pairs[i];
+    if (Jt != nullptr) Jt[k * rows + first_row + i] = pairs[i];
   }
 }
 
@@ -444,7 +424,7 @@ MRESULT ComputeJacobianEtc(MHandle memory, float* J, float* JtJ, float* g, float
                                        rangeWeight, weightingMode, innerWeight, paramCount});
   if (!derivatives) return residuals.Evaluate(pose, r);
   const n3ds::ScratchArray<float> transpose(memory, residuals.JacobianSize());
-  // A point without depth is the graver news, so the points are gone through all the same.
+  // Zero depth takes precedence over a failed allocation, so the points are evaluated first.
   const MRESULT status = residuals.Linearise(pose, r, J, transpose.get());
   if (status != N3DS_OK) return status;
   if (!transpose) return N3DS_NO_MEMORY;

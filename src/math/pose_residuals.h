@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: MIT
 // The residuals that the pose solver minimises: how far a head model's points, moved by a pose and
-// projected by a pinhole camera, land from a face's landmarks in the picture.
+// projected by a pinhole camera, land from a face's landmarks in the image.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
 
 #include "norvale_3d_sticker_core.h"
+#include "platform/simd.h"
 
 namespace n3ds {
 
@@ -20,7 +21,7 @@ struct PoseProblem {
   const float* model_points;  // X, Y, Z per point
   int32_t point_count;
   const float* camera;
-  float contour_weight;     // weight of an outline landmark's distance across the middle line
+  float contour_weight;     // weight of an outline landmark's distance across the midline
   float range_weight;       // weight of the parts that speech moves, the mouth and the chin
   int64_t weighting_mode;   // not 0: landmarks other than eye corners and nose count a tenth
   float inner_weight;       // balance between the two sides of the nose, 1 when alike
@@ -32,8 +33,8 @@ class PoseResiduals {
  public:
   explicit PoseResiduals(const PoseProblem& problem);
 
-  // r: two residuals per point, projected minus observed, weighted. Returns N3DS_NUMERICAL, with r
-  // partly written, when a point has no depth.
+  // r: two residuals per point, projected minus observed, weighted. Returns N3DS_NUMERICAL when
+  // a point has no depth; the points before it are then written, and none after it.
   MRESULT Evaluate(const float* pose, float* r) const;
 
   // The same with the Jacobian J of r, 2 point_count x parameter_count, row-major, and its
@@ -66,18 +67,27 @@ class PoseResiduals {
   };
 
   static MiddleLine FindMiddleLine(const PoseProblem& problem);
-  // Whether an outline landmark's observation (ox, oy) lies nearer the line than its projection.
-  bool LiesInside(float u, float v, float ox, float oy) const;
-  // Turns a pair along u and v, residuals or derivatives, into its part across the line.
-  void ProjectAcross(float* along_u, float* along_v) const;
+  // In a unit of the line's own; 0 for all points when there is no line.
+  F32x4 DistanceFromMiddle(F32x4 x, F32x4 y) const;
+  // Turns pairs along u and v, residuals or derivatives, into their part across the line, in the
+  // lanes of `across`.
+  void ProjectAcross(Mask32x4 across, F32x4* along_u, F32x4* along_v) const;
 
   struct Points;
   struct Derivatives;
   struct View;
   Points Project(const View& view, int32_t first, int32_t count) const;
   static Derivatives Differentiate(const View& view, const Points& p);
-  void Store(const Derivatives& d, int32_t first, int32_t count, float* J, float* Jt) const;
-  void WeightOtherColumns(const Points& p, const bool* across, int32_t first, int32_t count,
+  // The block's outline landmarks whose observation lies nearer the line than their projection.
+  Mask32x4 AcrossOf(const Points& p, int32_t first) const;
+  // Writes u and v of `count` points in turns.
+  static void StorePairs(F32x4 u, F32x4 v, int32_t count, float* pairs);
+  void StoreDerivatives(const Derivatives& d, int32_t first, int32_t count, float* J,
+                        float* Jt) const;
+  void StoreColumn(F32x4 along_u, F32x4 along_v, size_t k, int32_t first, int32_t count, float* J,
+                   float* Jt) const;
+  // `across` is null where no lane is set.
+  void WeightOtherColumns(const Points& p, const Mask32x4* across, int32_t first, int32_t count,
                           float* J, float* Jt) const;
   template <bool kDerivatives>
   MRESULT EvaluatePoints(const float* pose, float* r, float* J, float* Jt) const;

@@ -12,16 +12,14 @@
 #include <cstddef>
 
 #include "norvale_3d_sticker_core.h"
+#include "platform/simd.h"
 
-#if !defined(N3DS_DISABLE_SIMD) && defined(__x86_64__)
-#include <immintrin.h>
-#define N3DS_AVX2_PRODUCT 1
-// Only these functions may use AVX2 and FMA; which is decided at run time.
-#define N3DS_VECTOR_CODE __attribute__((target("avx2,fma")))
-#elif !defined(N3DS_DISABLE_SIMD) && defined(__aarch64__)
-#include <arm_neon.h>
-#define N3DS_NEON_PRODUCT 1
-#define N3DS_VECTOR_CODE
+// The vector form is written over AVX2 or NEON; with SSE2 alone, which has no fused multiply-add, or
+// without SIMD there is none.
+#if N3DS_SIMD_AVX2
+#define N3DS_PRODUCT_CODE N3DS_AVX2_CODE
+#elif N3DS_SIMD_NEON
+#define N3DS_PRODUCT_CODE
 #endif
 
 namespace n3ds {
@@ -39,16 +37,16 @@ void MultiplyPortable(float* C, const float* A, const float* B, int32_t m, int32
   }
 }
 
-#ifdef N3DS_VECTOR_CODE
+#ifdef N3DS_PRODUCT_CODE
 namespace {
 
 // The accumulators only live in registers if the loops over them are gone before the optimiser
 // looks at the arrays; gcc 12 at -O3 stores all of them in every step otherwise.
 #define N3DS_UNROLL _Pragma("GCC unroll 16")
-#define N3DS_VECTOR_INLINE N3DS_VECTOR_CODE __attribute__((always_inline)) inline
+#define N3DS_PRODUCT_INLINE N3DS_PRODUCT_CODE __attribute__((always_inline)) inline
 
 // A thin vector type: the tiles below are written once over these few operations.
-#if N3DS_AVX2_PRODUCT
+#if N3DS_SIMD_AVX2
 
 using Lanes = __m256;
 constexpr int kLanes = 8;
@@ -57,23 +55,25 @@ constexpr int kTileRows = 4;    // rows of a tile two or more blocks wide
 constexpr int kNarrowRows = 8;  // rows of a tile one block wide
 using PartialMask = __m256i;    // which lanes of a partial block exist
 
-N3DS_VECTOR_INLINE Lanes Zero() { return _mm256_setzero_ps(); }
-N3DS_VECTOR_INLINE Lanes Load(const float* p) { return _mm256_loadu_ps(p); }
-N3DS_VECTOR_INLINE Lanes Broadcast(const float* p) { return _mm256_broadcast_ss(p); }
-N3DS_VECTOR_INLINE void Store(float* p, Lanes v) { _mm256_storeu_ps(p, v); }
-N3DS_VECTOR_INLINE Lanes MultiplyAdd(Lanes a, Lanes b, Lanes c) { return _mm256_fmadd_ps(a, b, c); }
-N3DS_VECTOR_INLINE PartialMask MaskOfFirst(int count) {
+N3DS_PRODUCT_INLINE Lanes Zero() { return _mm256_setzero_ps(); }
+N3DS_PRODUCT_INLINE Lanes Load(const float* p) { return _mm256_loadu_ps(p); }
+N3DS_PRODUCT_INLINE Lanes Broadcast(const float* p) { return _mm256_broadcast_ss(p); }
+N3DS_PRODUCT_INLINE void Store(float* p, Lanes v) { _mm256_storeu_ps(p, v); }
+N3DS_PRODUCT_INLINE Lanes MultiplyAdd(Lanes a, Lanes b, Lanes c) {
+  return _mm256_fmadd_ps(a, b, c);
+}
+N3DS_PRODUCT_INLINE PartialMask MaskOfFirst(int count) {
   const __m256i lane = _mm256_setr_epi32(0, 1, 2, 3, 4, 5, 6, 7);
   return _mm256_cmpgt_epi32(_mm256_set1_epi32(count), lane);
 }
-N3DS_VECTOR_INLINE Lanes LoadPartial(const float* p, PartialMask mask) {
+N3DS_PRODUCT_INLINE Lanes LoadPartial(const float* p, PartialMask mask) {
   return _mm256_maskload_ps(p, mask);
 }
-N3DS_VECTOR_INLINE void StorePartial(float* p, PartialMask mask, Lanes v) {
+N3DS_PRODUCT_INLINE void StorePartial(float* p, PartialMask mask, Lanes v) {
   _mm256_maskstore_ps(p, mask, v);
 }
 // Four columns of kLanes rows: lane r of out[t] is rows[r][t].
-N3DS_VECTOR_INLINE void LoadColumns(const float* const* rows, ptrdiff_t offset, Lanes* out) {
+N3DS_PRODUCT_INLINE void LoadColumns(const float* const* rows, ptrdiff_t offset, Lanes* out) {
   Lanes v[4];
   for (int r = 0; r < 4; ++r) {
     const __m256 low = _mm256_castps128_ps256(_mm_loadu_ps(rows[r] + offset));
@@ -98,23 +98,23 @@ constexpr int kTileRows = 4;
 constexpr int kNarrowRows = 8;
 using PartialMask = int;  // how many lanes exist
 
-N3DS_VECTOR_INLINE Lanes Zero() { return vdupq_n_f32(0.0f); }
-N3DS_VECTOR_INLINE Lanes Load(const float* p) { return vld1q_f32(p); }
-N3DS_VECTOR_INLINE Lanes Broadcast(const float* p) { return vld1q_dup_f32(p); }
-N3DS_VECTOR_INLINE void Store(float* p, Lanes v) { vst1q_f32(p, v); }
-N3DS_VECTOR_INLINE Lanes MultiplyAdd(Lanes a, Lanes b, Lanes c) { return vfmaq_f32(c, a, b); }
-N3DS_VECTOR_INLINE PartialMask MaskOfFirst(int count) { return count; }
-N3DS_VECTOR_INLINE Lanes LoadPartial(const float* p, PartialMask count) {
+N3DS_PRODUCT_INLINE Lanes Zero() { return vdupq_n_f32(0.0f); }
+N3DS_PRODUCT_INLINE Lanes Load(const float* p) { return vld1q_f32(p); }
+N3DS_PRODUCT_INLINE Lanes Broadcast(const float* p) { return vld1q_dup_f32(p); }
+N3DS_PRODUCT_INLINE void Store(float* p, Lanes v) { vst1q_f32(p, v); }
+N3DS_PRODUCT_INLINE Lanes MultiplyAdd(Lanes a, Lanes b, Lanes c) { return vfmaq_f32(c, a, b); }
+N3DS_PRODUCT_INLINE PartialMask MaskOfFirst(int count) { return count; }
+N3DS_PRODUCT_INLINE Lanes LoadPartial(const float* p, PartialMask count) {
   if (count == 1) return vld1q_lane_f32(p, Zero(), 0);
   const Lanes two = vcombine_f32(vld1_f32(p), vdup_n_f32(0.0f));
   return count == 2 ? two : vld1q_lane_f32(p + 2, two, 2);
 }
-N3DS_VECTOR_INLINE void StorePartial(float* p, PartialMask count, Lanes v) {
+N3DS_PRODUCT_INLINE void StorePartial(float* p, PartialMask count, Lanes v) {
   vst1q_lane_f32(p, v, 0);
   if (count > 1) vst1q_lane_f32(p + 1, v, 1);
   if (count > 2) vst1q_lane_f32(p + 2, v, 2);
 }
-N3DS_VECTOR_INLINE void LoadColumns(const float* const* rows, ptrdiff_t offset, Lanes* out) {
+N3DS_PRODUCT_INLINE void LoadColumns(const float* const* rows, ptrdiff_t offset, Lanes* out) {
   const float32x4x2_t v02 = vzipq_f32(Load(rows[0] + offset), Load(rows[2] + offset));
   const float32x4x2_t v13 = vzipq_f32(Load(rows[1] + offset), Load(rows[3] + offset));
   const float32x4x2_t low = vzipq_f32(v02.val[0], v13.val[0]);
@@ -134,7 +134,7 @@ constexpr int kMostRowGroups = 3;
 // Pointers to `count` rows of A from its first; rows beyond the last are the last again, so that a
 // tile always has all its rows and no load leaves A.
 template <int count>
-N3DS_VECTOR_INLINE void RowPointers(const float* A, int32_t rows, int32_t k, const float** out) {
+N3DS_PRODUCT_INLINE void RowPointers(const float* A, int32_t rows, int32_t k, const float** out) {
   for (int r = 0; r < count; ++r) out[r] = A + std::min(r, rows - 1) * ptrdiff_t{k};
 }
 
@@ -142,8 +142,8 @@ N3DS_VECTOR_INLINE void RowPointers(const float* A, int32_t rows, int32_t k, con
 // a row of C ends with the row, over columns of the block before it where the width asks for that:
 // both compute them alike.
 template <int kRows, int kBlocks>
-N3DS_VECTOR_CODE void MultiplyTile(float* C, const float* A, const float* B, int32_t rows,
-                                   int32_t k, int32_t n, int32_t j) {
+N3DS_PRODUCT_CODE void MultiplyTile(float* C, const float* A, const float* B, int32_t rows,
+                                    int32_t k, int32_t n, int32_t j) {
   ptrdiff_t column[kBlocks];
   N3DS_UNROLL
   for (int b = 0; b < kBlocks; ++b) column[b] = std::min(j + b * kLanes, n - kLanes);
@@ -178,8 +178,8 @@ N3DS_VECTOR_CODE void MultiplyTile(float* C, const float* A, const float* B, int
 }
 
 // The same for all n < kLanes columns.
-N3DS_VECTOR_CODE void MultiplyNarrowTile(float* C, const float* A, const float* B, int32_t rows,
-                                         int32_t k, int32_t n) {
+N3DS_PRODUCT_CODE void MultiplyNarrowTile(float* C, const float* A, const float* B, int32_t rows,
+                                          int32_t k, int32_t n) {
   const PartialMask mask = MaskOfFirst(n);
   const float* row[kNarrowRows];
   RowPointers<kNarrowRows>(A, rows, k, row);
@@ -203,8 +203,8 @@ N3DS_VECTOR_CODE void MultiplyNarrowTile(float* C, const float* A, const float* 
 
 // `rows` (at most kGroups * kLanes) entries of a single column; lanes are rows.
 template <int kGroups>
-N3DS_VECTOR_CODE void MultiplyColumnTile(float* C, const float* A, const float* B, int32_t rows,
-                                         int32_t k) {
+N3DS_PRODUCT_CODE void MultiplyColumnTile(float* C, const float* A, const float* B, int32_t rows,
+                                          int32_t k) {
   const float* row[kGroups * kLanes];
   RowPointers<kGroups * kLanes>(A, rows, k, row);
 
@@ -237,8 +237,8 @@ N3DS_VECTOR_CODE void MultiplyColumnTile(float* C, const float* A, const float* 
 
 // All rows of `blocks` blocks of columns from column j on.
 template <int kBlocks = 1>
-N3DS_VECTOR_CODE void MultiplyColumns(int blocks, float* C, const float* A, const float* B,
-                                      int32_t m, int32_t k, int32_t n, int32_t j) {
+N3DS_PRODUCT_CODE void MultiplyColumns(int blocks, float* C, const float* A, const float* B,
+                                       int32_t m, int32_t k, int32_t n, int32_t j) {
   if constexpr (kBlocks < kWidestTile) {
     if (blocks > kBlocks) {
       MultiplyColumns<kBlocks + 1>(blocks, C, A, B, m, k, n, j);
@@ -255,8 +255,8 @@ N3DS_VECTOR_CODE void MultiplyColumns(int blocks, float* C, const float* A, cons
 
 // `rows` rows, which take `groups` groups of lanes, of a single column.
 template <int kGroups = 1>
-N3DS_VECTOR_CODE void MultiplyRowGroups(int groups, float* C, const float* A, const float* B,
-                                        int32_t rows, int32_t k) {
+N3DS_PRODUCT_CODE void MultiplyRowGroups(int groups, float* C, const float* A, const float* B,
+                                         int32_t rows, int32_t k) {
   if constexpr (kGroups < kMostRowGroups) {
     if (groups > kGroups) {
       MultiplyRowGroups<kGroups + 1>(groups, C, A, B, rows, k);
@@ -266,8 +266,8 @@ N3DS_VECTOR_CODE void MultiplyRowGroups(int groups, float* C, const float* A, co
   MultiplyColumnTile<kGroups>(C, A, B, rows, k);
 }
 
-N3DS_VECTOR_CODE void MultiplyVector(float* C, const float* A, const float* B, int32_t m, int32_t k,
-                                     int32_t n) {
+N3DS_PRODUCT_CODE void MultiplyVector(float* C, const float* A, const float* B, int32_t m,
+                                      int32_t k, int32_t n) {
   if (n == 1) {
     for (int32_t i = 0; i < m;) {
       const int32_t rows = std::min(kMostRowGroups * kLanes, m - i);
@@ -293,13 +293,12 @@ N3DS_VECTOR_CODE void MultiplyVector(float* C, const float* A, const float* B, i
 }
 
 }  // namespace
-#endif  // N3DS_VECTOR_CODE
+#endif  // N3DS_PRODUCT_CODE
 
 MatrixProduct SimdMatrixProduct() {
-#if N3DS_AVX2_PRODUCT
-  if (!__builtin_cpu_supports("avx2") || !__builtin_cpu_supports("fma")) return nullptr;
-  return MultiplyVector;
-#elif N3DS_NEON_PRODUCT
+#if N3DS_SIMD_AVX2
+  return HasAvx2() ? MultiplyVector : nullptr;
+#elif N3DS_SIMD_NEON
   return MultiplyVector;
 #else
   return nullptr;

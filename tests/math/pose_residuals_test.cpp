@@ -401,6 +401,48 @@ TEST(OutlineRuleTest, WithoutTheEyeCornersThereIsNoLine) {
   EXPECT_TRUE(SameBits(Residuals(c, kFrontal), r));
 }
 
+TEST(OutlineRuleTest, FiftyTwoPointsReachTheEyeCorners) {
+  PoseCase c = ExactCase(kFrontal);
+  c.landmarks.resize(2 * 52);
+  c.model.resize(3 * 52);
+  c.landmarks[0] += 6;
+  const std::vector<float> r = Residuals(c, kFrontal);
+  c.contour_weight = 0.25f;
+  const std::vector<float> weighted = Residuals(c, kFrontal);
+  EXPECT_NE(weighted[0], r[0]);
+  EXPECT_TRUE(SameBits({weighted.begin() + 2, weighted.end()}, {r.begin() + 2, r.end()}));
+}
+
+// The temple is projected to (520, 360) and observed as far on the other side of the line.
+TEST(OutlineRuleTest, ObservationAsFarFromTheLineAsTheProjectionKeepsItsResidual) {
+  struct Place {
+    float chin_x, chin_y, left_x, left_y, right_x, observed_x, observed_y;
+  };
+  const Place places[] = {
+      {640, 460, 600, 300, 680, 760, 350},  // vertical at x = 640
+      {640, 493, 600, 301, 684, 530, 626},  // horizontal at y = 493
+      {600, 400, 600, 279, 680, 640, 360},  // y = 2 x - 800
+  };
+  for (const Place& place : places) {
+    PoseCase c;
+    c.camera = {1024, 0, 640, 0, 1024, 360, 0, 0, 1};
+    c.model.assign(3 * 52, 0);
+    c.model[0] = -60;
+    c.landmarks.assign(2 * 52, 0);
+    c.landmarks[0] = place.observed_x;
+    c.landmarks[1] = place.observed_y;
+    c.landmarks[2 * 9] = place.chin_x;
+    c.landmarks[2 * 9 + 1] = place.chin_y;
+    c.landmarks[2 * 45] = place.left_x;
+    c.landmarks[2 * 45 + 1] = place.left_y;
+    c.landmarks[2 * 51] = place.right_x;
+    c.contour_weight = 0.25f;
+    const std::vector<float> r = Residuals(c, {1, 0, 0, 0, 0, 0, 512});
+    EXPECT_EQ(r[0], 520 - place.observed_x);
+    EXPECT_EQ(r[1], 360 - place.observed_y);
+  }
+}
+
 TEST(OutlineRuleTest, LandmarksBeyondTheRangeOfIntegersAreHarmless) {
   constexpr float kHuge = 3e38f;
   const float values[] = {kHuge,         -kHuge,        std::numeric_limits<float>::infinity(),
@@ -446,6 +488,31 @@ TEST(ZeroDepthTest, PointOnTheCameraPlaneFailsAndPrintsOneLine) {
                         N3DS_NUMERICAL);
             }),
             "zero in zc\n");
+}
+
+TEST(ZeroDepthTest, PointsBeforeTheOneWithoutDepthAreWritten) {
+  constexpr Pose kSquare = {1, 0, 0, 0, 0, 0, 512};
+  const PoseCase good = ExactCase(kSquare);
+  for (const int32_t params : {3, 7, 9}) {
+    const size_t columns = static_cast<size_t>(params);
+    const Evaluation whole = Evaluate(good, kSquare, params);
+    for (size_t failing = 0; failing < static_cast<size_t>(kHeadPoints); ++failing) {
+      PoseCase c = good;
+      c.model[3 * failing] = c.model[3 * failing + 1] = 0;
+      c.model[3 * failing + 2] = -512;
+      Evaluation e;
+      PrintedBy([&] { e = Evaluate(c, kSquare, params); });
+      ASSERT_EQ(e.status, N3DS_NUMERICAL);
+      for (size_t i = 0; i < e.r.size(); ++i) {
+        const bool written = i < 2 * failing;
+        ASSERT_EQ(e.r[i], written ? whole.r[i] : kUnwritten) << failing;
+        for (size_t k = 0; k < columns; ++k) {
+          const float j = e.J[i * columns + k];
+          ASSERT_EQ(j, written ? whole.J[i * columns + k] : kUnwritten) << failing << ", " << k;
+        }
+      }
+    }
+  }
 }
 
 TEST(ZeroDepthTest, LimitIsComparedInDouble) {
