@@ -342,7 +342,7 @@ TEST_F(CliMesh, RefusesWhatItCannotDo) {
   folder_.Write("file", "x");
   ExpectFailure({"mesh", track, "--out", folder_.Path("file")}, kFailed, "file", {"file"});
   ExpectFailure({"mesh", track, "--out", folder_.Path("file/m")}, kFailed,
-                "file/m: the folder cannot be made", {"file"});
+                "file/m: cannot create directory", {"file"});
   EXPECT_EQ(folder_.Read("file"), "x");
 }
 

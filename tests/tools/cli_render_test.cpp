@@ -160,6 +160,17 @@ TEST_F(CliRender, AFilmThatCannotBeMadeLeavesNothing) {
   setenv("PATH", path.c_str(), 1);
 }
 
+// The encoder goes too, or it would write the file again.
+TEST_F(CliRender, ASignalRemovesAHalfFilm) {
+  const std::string track = LongTrack("photo_astronaut", 3000);
+  for (const int signal : {SIGINT, SIGTERM}) {
+    const pid_t child = Start({"render", track, "--out", folder_.Path("a.mp4"), "--size", "64x64"});
+    EXPECT_EQ(EndBySignal(child, signal, folder_.Path("")).signal, signal);
+    usleep(200000);
+    EXPECT_THAT(folder_.Names(), ::testing::IsEmpty());
+  }
+}
+
 TEST_F(CliRender, RefusesADamagedModel) {
   ExpectFailure({"render", ExampleTrack("photo_astronaut"), "--model",
                  console_.Write("m.bin", "no model"), "--out", folder_.Path("a.png")},

@@ -126,6 +126,37 @@ TEST_F(Cli, AFailedTrackLeavesTheOldResults) {
   EXPECT_EQ(folder_.Read("r.jsonl"), "old");
 }
 
+TEST_F(Cli, ASignalRemovesTheFilesOfHalfARun) {
+  const std::string track = LongTrack("photo_astronaut", 3000);
+  for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
+    const pid_t child = Start({"mesh", track, "--out", folder_.Path("a/meshes")});
+    EXPECT_EQ(EndBySignal(child, signal, folder_.Path("a/meshes")).signal, signal);
+    EXPECT_THAT(folder_.Names(), IsEmpty());
+  }
+  // What was there before stays.
+  std::filesystem::create_directory(folder_.Path("meshes"));
+  folder_.Write("meshes/frame_002999.obj", "old");
+  const pid_t child = Start({"mesh", track, "--out", folder_.Path("meshes")});
+  while (!std::filesystem::exists(folder_.Path("meshes/frame_000003.obj")) && !HasEnded(child)) {
+    usleep(1000);
+  }
+  kill(child, SIGTERM);
+  EXPECT_EQ(Finish(child).signal, SIGTERM);
+  ASSERT_THAT(folder_.Names(), ElementsAre("meshes"));
+  EXPECT_EQ(std::distance(std::filesystem::directory_iterator(folder_.Path("meshes")), {}), 1);
+  EXPECT_EQ(folder_.Read("meshes/frame_002999.obj"), "old");
+}
+
+TEST_F(Cli, AFailedRunRemovesTheFilesItHasMade) {
+  // The target of the third file cannot be replaced.
+  std::filesystem::create_directories(folder_.Path("m/frame_000002.obj"));
+  const Outcome outcome =
+      Run({"mesh", LongTrack("photo_astronaut", 5), "--out", folder_.Path("m")});
+  EXPECT_EQ(outcome.exit_code, kFailed);
+  EXPECT_THAT(outcome.err, HasSubstr("frame_000002.obj: cannot be written (Is a directory)"));
+  EXPECT_EQ(std::distance(std::filesystem::directory_iterator(folder_.Path("m")), {}), 1);
+}
+
 TEST_F(Cli, RefusesFilesThatAreNotThere) {
   ExpectFailure({"track", folder_.Path("none")}, kFailed, "none: the file cannot be opened");
   ExpectFailure({"track", folder_.Path("")}, kFailed, "the file cannot be opened");

@@ -1,7 +1,10 @@
 // SPDX-License-Identifier: MIT
 // Output files, tables and results.
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <cmath>
 #include <cstdlib>
@@ -50,9 +53,158 @@ TEST(AtomicFile, RefusesAFolderThatIsNotThere) {
 TEST(AtomicFile, RefusesToReplaceAFolder) {
   const ScratchFolder folder;
   std::filesystem::create_directory(folder.Path("taken"));
-  AtomicFile file(folder.Path("taken"));
+  EXPECT_THROW(AtomicFile(folder.Path("taken")), Error);
+}
+
+TEST(AtomicFile, KeepsTheModeOfAFileAndHonoursTheMaskOfANewOne) {
+  const ScratchFolder folder;
+  chmod(folder.Write("private.txt", "old").c_str(), 0600);
+  chmod(folder.Write("open.txt", "old").c_str(), 0666);
+  const mode_t before = umask(027);
+  for (const char* name : {"private.txt", "open.txt", "new.txt"}) {
+    AtomicFile file(folder.Path(name));
+    file.stream() << "new";
+    file.Commit();
+  }
+  umask(before);
+  const auto mode = [&](const char* name) {
+    struct stat status {};
+    stat(folder.Path(name).c_str(), &status);
+    return status.st_mode & 0777;
+  };
+  EXPECT_EQ(mode("private.txt"), 0600u);
+  EXPECT_EQ(mode("open.txt"), 0666u);
+  EXPECT_EQ(mode("new.txt"), 0640u);
+}
+
+TEST(AtomicFile, ReplacesWhatALinkPointsTo) {
+  const ScratchFolder folder;
+  std::filesystem::create_directory(folder.Path("data"));
+  folder.Write("data/a.txt", "old");
+  std::filesystem::create_symlink("data/a.txt", folder.Path("first"));
+  std::filesystem::create_symlink(folder.Path("first"), folder.Path("second"));
+  AtomicFile file(folder.Path("second"));
+  file.stream() << "new";
+  EXPECT_EQ(folder.Read("data/a.txt"), "old");
+  file.Commit();
+  EXPECT_EQ(folder.Read("data/a.txt"), "new");
+  EXPECT_TRUE(std::filesystem::is_symlink(folder.Path("first")));
+  EXPECT_TRUE(std::filesystem::is_symlink(folder.Path("second")));
+  EXPECT_FALSE(std::filesystem::is_symlink(folder.Path("data/a.txt")));
+}
+
+TEST(AtomicFile, MakesTheFileThatADanglingLinkPointsTo) {
+  const ScratchFolder folder;
+  std::filesystem::create_symlink("a.txt", folder.Path("link"));
+  AtomicFile file(folder.Path("link"));
+  file.stream() << "new";
+  file.Commit();
+  EXPECT_EQ(folder.Read("a.txt"), "new");
+  EXPECT_TRUE(std::filesystem::is_symlink(folder.Path("link")));
+}
+
+TEST(AtomicFile, RefusesLinksThatLeadNowhere) {
+  const ScratchFolder folder;
+  std::filesystem::create_symlink("loop", folder.Path("loop"));
+  EXPECT_THROW(AtomicFile(folder.Path("loop")), Error);
+}
+
+std::string ReadAll(int descriptor) {
+  std::string text;
+  char bytes[4096];
+  for (ssize_t count = 0; (count = read(descriptor, bytes, sizeof bytes)) > 0;) {
+    text.append(bytes, static_cast<std::size_t>(count));
+  }
+  return text;
+}
+
+TEST(AtomicFile, WritesIntoPipesAndLinksToThem) {
+  const ScratchFolder folder;
+  const std::string fifo = folder.Path("fifo");
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+  std::filesystem::create_symlink("fifo", folder.Path("link"));
+  for (const char* name : {"fifo", "link"}) {
+    const int reader = open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
+    AtomicFile file(folder.Path(name));
+    EXPECT_TRUE(file.is_direct());
+    file.stream() << "through";
+    file.Commit();
+    EXPECT_EQ(ReadAll(reader), "through");
+    close(reader);
+  }
+  EXPECT_TRUE(std::filesystem::is_fifo(fifo));
+  EXPECT_THAT(folder.Names(), ElementsAre("fifo", "link"));
+  EXPECT_THROW(AtomicPath{fifo}, Error);  // a writer that wants a name wants a file
+}
+
+TEST(AtomicFile, WritesIntoOpenDescriptors) {
+  const ScratchFolder folder;
+  int ends[2];
+  ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
+  const int log = open(folder.Path("log").c_str(), O_WRONLY | O_CREAT | O_APPEND, 0600);
+  ASSERT_EQ(write(log, "before ", 7), 7);
+  for (const int descriptor : {ends[1], log}) {
+    for (const char* place : {"/dev/fd/", "/proc/self/fd/"}) {
+      AtomicFile file(place + std::to_string(descriptor));
+      file.stream() << "x";
+      file.Commit();
+    }
+  }
+  close(ends[1]);
+  close(log);
+  EXPECT_EQ(ReadAll(ends[0]), "xx");
+  close(ends[0]);
+  EXPECT_EQ(folder.Read("log"), "before xx");
+  EXPECT_THROW(AtomicFile("/dev/fd/" + std::to_string(ends[1])), Error);  // closed by now
+}
+
+// A pipe first: where it is not left alone, a device would not be either.
+TEST(AtomicFile, ReportsAFullDevice) {
+  const ScratchFolder folder;
+  const std::string fifo = folder.Path("fifo");
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+  const int reader = open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
+  AtomicFile(fifo).Commit();
+  close(reader);
+  ASSERT_TRUE(std::filesystem::is_fifo(fifo));
+
+  std::filesystem::create_symlink("/dev/full", folder.Path("full"));
+  AtomicFile file(folder.Path("full"));
+  ASSERT_TRUE(file.is_direct());
   file.stream() << "text";
-  EXPECT_THROW(file.Commit(), Error);
+  try {
+    file.Commit();
+    ADD_FAILURE();
+  } catch (const Error& error) {
+    EXPECT_THAT(error.what(), HasSubstr("full: cannot be written (No space left on device)"));
+  }
+  EXPECT_TRUE(std::filesystem::is_character_file("/dev/full"));
+}
+
+TEST(AtomicFile, WritesMoreThanItsBufferHolds) {
+  const ScratchFolder folder;
+  const std::string text(1000001, 'x');
+  AtomicFile file(folder.Path("a.txt"));
+  file.stream() << text << 'y';
+  file.Commit();
+  EXPECT_EQ(folder.Read("a.txt"), text + "y");
+}
+
+TEST(AtomicFile, RefusesAProtectedFile) {
+  if (geteuid() == 0) GTEST_SKIP() << "nothing is protected from root";
+  const ScratchFolder folder;
+  chmod(folder.Write("a.txt", "old").c_str(), 0400);
+  EXPECT_THROW(AtomicFile(folder.Path("a.txt")), Error);
+  EXPECT_THAT(folder.Names(), ElementsAre("a.txt"));
+}
+
+TEST(AtomicFile, TakesTheLongestNames) {
+  const ScratchFolder folder;
+  const std::string name(255, 'n');
+  AtomicFile file(folder.Path(name));
+  file.stream() << "whole";
+  file.Commit();
+  EXPECT_EQ(folder.Read(name), "whole");
 }
 
 TEST(TextTable, LinesUpNumbers) {

@@ -1,9 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "commands/frames.h"
 
-#include <cstdio>
-#include <filesystem>
-
 #include "support/error.h"
 
 namespace n3ds::tool {
@@ -22,18 +19,6 @@ void CheckFrame(const std::string& path, const FrameResult& result) {
   if (!result.ok) {
     throw Error(path + ": the engine failed on frame " + std::to_string(result.number));
   }
-}
-
-void MakeFolder(const std::string& path) {
-  std::error_code error;
-  std::filesystem::create_directories(path, error);
-  if (error) throw Error(path + ": the folder cannot be made (" + error.message() + ")");
-}
-
-std::string FrameName(std::int64_t number, const char* ending) {
-  char name[32];
-  std::snprintf(name, sizeof name, "/frame_%06lld%s", static_cast<long long>(number), ending);
-  return name;
 }
 
 }  // namespace n3ds::tool

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Frames of a track as commands pick, name and write them.
+// Frames of a track as commands pick and check them.
 #pragma once
 
 #include <cstddef>
@@ -19,10 +19,5 @@ std::size_t ChosenFrame(const Track& track, const std::string& path,
 
 // Throws Error when the engine failed on the frame.
 void CheckFrame(const std::string& path, const FrameResult& result);
-
-// Makes a folder for a file a frame. Throws Error.
-void MakeFolder(const std::string& path);
-// Name of a frame's file in it, "/frame_000012.png" for the ending ".png".
-std::string FrameName(std::int64_t number, const char* ending);
 
 }  // namespace n3ds::tool

@@ -8,6 +8,7 @@
 
 #include "commands/commands.h"
 #include "norvale_3d_sticker_engine.h"
+#include "support/unfinished.h"
 
 namespace {
 
@@ -50,6 +51,7 @@ int Run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
+  n3ds::tool::RemoveUnfinishedOnSignals();
   try {
     return Run(argc, argv);
   } catch (const std::exception& error) {

@@ -9,6 +9,7 @@
 #include <string>
 
 #include "commands/commands.h"
+#include "commands/frame_folder.h"
 #include "commands/frames.h"
 #include "engine/engine_session.h"
 #include "engine/mesh_file.h"
@@ -37,7 +38,7 @@ struct MeshOptions {
 void RunMeshCommand(const MeshOptions& options) {
   const Track track = ReadTrackFile(options.track);
   EngineSession session(options.model, track.header, TrackMode::kMask);
-  MakeFolder(options.out);
+  FrameFolder folder(options.out);
   Progress progress("meshes of " + track.name, track.frames.size());
   std::size_t written = 0;
   for (std::size_t f = 0; f < track.frames.size(); ++f) {
@@ -50,12 +51,13 @@ void RunMeshCommand(const MeshOptions& options) {
       throw Error(options.track + ": frame " + std::to_string(result.number) +
                   " has a mesh that is not finite");
     }
-    AtomicFile file(options.out + FrameName(result.number, ".obj"));
+    AtomicFile file(folder.File(result.number, ".obj"));
     WriteMeshObj(file.stream(), result, session.texture_coordinates(),
                  SpacesByName().at(options.space));
     file.Commit();
     ++written;
   }
+  folder.Commit();
   std::printf("%s: %zu files\n", options.out.c_str(), written);
 }
 

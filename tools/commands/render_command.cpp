@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "commands/commands.h"
+#include "commands/frame_folder.h"
 #include "commands/frames.h"
 #include "commands/options.h"
 #include "engine/engine_session.h"
@@ -152,10 +153,11 @@ class Drawing {
       DrawFrames(
           [&](const FrameResult&, const Picture& picture) { WritePng(options_.out, picture); });
     } else {
-      MakeFolder(options_.out);
+      FrameFolder folder(options_.out);
       DrawFrames([&](const FrameResult& result, const Picture& picture) {
-        WritePng(options_.out + FrameName(result.number, ".png"), picture);
+        WritePng(folder.File(result.number, ".png"), picture);
       });
+      folder.Commit();
     }
   }
 

@@ -12,16 +12,39 @@
 #include <cstring>
 
 #include "support/error.h"
+#include "support/unfinished.h"
 
 namespace n3ds::tool {
 
+namespace {
+
+// Starts ffmpeg with `input` as its standard input; 0 or the error's number.
+int StartEncoder(const char* const* arguments, int input, pid_t& encoder) {
+  posix_spawn_file_actions_t actions;
+  posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_adddup2(&actions, input, STDIN_FILENO);
+  const SignalsBlocked blocked;
+  posix_spawnattr_t attributes;
+  posix_spawnattr_init(&attributes);
+  // The child gets neither the blocked nor the ignored signals of its parent.
+  sigset_t restored;
+  sigemptyset(&restored);
+  sigaddset(&restored, SIGPIPE);
+  posix_spawnattr_setsigdefault(&attributes, &restored);
+  posix_spawnattr_setsigmask(&attributes, &blocked.before());
+  posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
+  const int failure = posix_spawnp(&encoder, "ffmpeg", &actions, &attributes,
+                                   const_cast<char* const*>(arguments), environ);
+  posix_spawnattr_destroy(&attributes);
+  posix_spawn_file_actions_destroy(&actions);
+  if (failure == 0) SetWritingChild(encoder);
+  return failure;
+}
+
+}  // namespace
+
 VideoWriter::VideoWriter(const std::string& path, int width, int height, double fps)
     : path_(path, ".mp4") {
-  // A place that cannot be written to is named here; ffmpeg would say it in words of its own.
-  std::FILE* probe = std::fopen(path_.temporary().c_str(), "wb");
-  if (probe == nullptr) throw Error(path + ": cannot be written (" + std::strerror(errno) + ")");
-  std::fclose(probe);
-
   // The encoder may die while it is written to; that must become an error, not the end of n3ds.
   std::signal(SIGPIPE, SIG_IGN);
   int ends[2];
@@ -54,12 +77,7 @@ VideoWriter::VideoWriter(const std::string& path, int width, int height, double 
                                            "+faststart",
                                            path_.temporary().c_str(),
                                            nullptr};
-  posix_spawn_file_actions_t actions;
-  posix_spawn_file_actions_init(&actions);
-  posix_spawn_file_actions_adddup2(&actions, ends[0], STDIN_FILENO);
-  const int failure = posix_spawnp(&encoder_, "ffmpeg", &actions, nullptr,
-                                   const_cast<char* const*>(arguments.data()), environ);
-  posix_spawn_file_actions_destroy(&actions);
+  const int failure = StartEncoder(arguments.data(), ends[0], encoder_);
   close(ends[0]);
   if (failure != 0) {
     close(ends[1]);
@@ -78,6 +96,7 @@ bool VideoWriter::Stop() {
   int status = 0;
   while (waitpid(encoder_, &status, 0) < 0 && errno == EINTR) {
   }
+  SetWritingChild(0);
   encoder_ = -1;
   return flushed && WIFEXITED(status) && WEXITSTATUS(status) == 0;
 }
