@@ -126,7 +126,7 @@ TEST(TrackFile, RefusesAFileThatCannotBeOpened) {
 TEST(TrackFile, RefusesAnEmptyFileAndOneWithoutFrames) {
   EXPECT_THAT(Refusal(""), HasSubstr("the file is empty"));
   EXPECT_THAT(Refusal("\n"), HasSubstr(":1: the line is empty"));
-  EXPECT_THAT(Refusal(kHeader), HasSubstr("there is a header but no frame"));
+  EXPECT_THAT(Refusal(kHeader), HasSubstr("the file contains no frames"));
 }
 
 TEST(TrackFile, RefusesWhatIsNotJson) {
@@ -138,16 +138,57 @@ TEST(TrackFile, RefusesWhatIsNotJson) {
               HasSubstr("not valid JSON"));
   EXPECT_THAT(FrameRefusal(std::string("\0{}", 3)), HasSubstr("not valid JSON"));
   EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[],"x":1e999})"), HasSubstr("not valid JSON"));
-  EXPECT_THAT(FrameRefusal("[1,2,3]"), HasSubstr(":3: not a JSON object but [1,2,3]"));
-  EXPECT_THAT(FrameRefusal("17"), HasSubstr("not a JSON object"));
+  EXPECT_THAT(FrameRefusal("[1,2,3]"), HasSubstr(":3: the line is [1,2,3], expected an object"));
+  EXPECT_THAT(FrameRefusal("17"), HasSubstr("the line is 17, expected an object"));
 }
 
 TEST(TrackFile, RefusesDeeplyNestedAndEndlessLines) {
-  EXPECT_THAT(FrameRefusal(std::string(500000, '[')), HasSubstr("not valid JSON"));
-  EXPECT_THAT(FrameRefusal(R"({"x":)" + std::string(400000, '[') + std::string(400000, ']') + "}"),
-              HasSubstr("field \"frame\" is missing"));
+  const auto nested = [](std::size_t depth) {
+    return std::string(depth, '[') + std::string(depth, ']');
+  };
+  const std::string refused = "some/talk.track.jsonl:3: nested more than 64 levels deep";
+  // As the whole line, as a value that is wrong, in a field that nothing reads.
+  for (const std::string& line :
+       {std::string(500000, '['), nested(200000), R"({"frame":)" + nested(200000) + "}",
+        R"({"frame":1,"faces":[],"x":)" + nested(200000) + "}",
+        R"({"frame":1,"faces":[],"x":)" + nested(64) + "}"}) {
+    EXPECT_EQ(FrameRefusal(line), refused);
+  }
+  EXPECT_EQ(FrameRefusal(R"({"frame":1,"faces":[],"x":)" + nested(63) + "}"), "");
+  // Brackets in strings are text.
+  EXPECT_EQ(FrameRefusal(R"({"frame":1,"faces":[],"x":"\"\\\"[)" + std::string(99, '{') + "\"}"),
+            "");
   EXPECT_THAT(FrameRefusal(std::string(kMaxTrackLine + 1, ' ')),
               HasSubstr(":3: the line is longer than a frame can be"));
+}
+
+TEST(TrackFile, RefusesALineThatCannotBeRead) {
+  class Broken : public std::stringbuf {
+   public:
+    explicit Broken(const std::string& text) : std::stringbuf(text, std::ios::in) {}
+
+   protected:
+    int_type underflow() override { throw std::ios_base::failure("device"); }
+  };
+  Broken buffer(std::string(kHeader) + "\n{");
+  std::istream in(&buffer);
+  try {
+    ReadTrack(in, "x");
+    ADD_FAILURE();
+  } catch (const TrackError& error) {
+    EXPECT_STREQ(error.what(), "x:2: the line cannot be read");
+  }
+}
+
+TEST(TrackReader, GivesEachFrameWhenItsLineHasArrived) {
+  std::stringstream in;
+  in << kHeader << '\n' << Frame(3, Face(1)) << '\n';
+  TrackReader reader(in, "x");
+  EXPECT_EQ(reader.header().width, 640);
+  EXPECT_EQ(reader.Next()->number, 3);
+  in << Frame(5, "") << '\n';
+  EXPECT_EQ(reader.Next()->number, 5);
+  EXPECT_FALSE(reader.Next().has_value());
 }
 
 TEST(TrackFile, RefusesAnotherFormatOrVersion) {
@@ -155,8 +196,9 @@ TEST(TrackFile, RefusesAnotherFormatOrVersion) {
   EXPECT_THAT(HeaderRefusal("face-track", "hand-track"), HasSubstr("not the header"));
   EXPECT_THAT(HeaderRefusal("\"face-track\"", "7"), HasSubstr("not the header"));
   EXPECT_THAT(HeaderRefusal("\"version\":1", "\"version\":2"),
-              HasSubstr("version 2 is not known, only 1 is"));
-  EXPECT_THAT(HeaderRefusal("\"version\":1", "\"version\":\"1\""), HasSubstr("whole number"));
+              HasSubstr("unsupported version 2 (expected 1)"));
+  EXPECT_THAT(HeaderRefusal("\"version\":1", "\"version\":\"1\""),
+              HasSubstr("expected an integer"));
 }
 
 TEST(TrackFile, RefusesAHeaderWithAMissingField) {
@@ -171,27 +213,29 @@ TEST(TrackFile, RefusesAHeaderWithAMissingField) {
 TEST(TrackFile, RefusesHeaderValuesThatMakeNoSense) {
   EXPECT_THAT(HeaderRefusal("640", "0"), HasSubstr("\"width\" is 0, outside 1 to 16384"));
   EXPECT_THAT(HeaderRefusal("480", "-480"), HasSubstr("\"height\" is -480, outside"));
-  EXPECT_THAT(HeaderRefusal("480", "480.5"), HasSubstr("a whole number is needed"));
+  EXPECT_THAT(HeaderRefusal("480", "480.5"), HasSubstr("expected an integer"));
   EXPECT_THAT(HeaderRefusal("640", "18446744073709551615"), HasSubstr("outside"));
-  EXPECT_THAT(HeaderRefusal("640", "99999999999999999999999"), HasSubstr("a whole number"));
-  EXPECT_THAT(HeaderRefusal("\"fps\":30", "\"fps\":0"), HasSubstr("\"fps\" is not above 0"));
-  EXPECT_THAT(HeaderRefusal("\"fps\":30", "\"fps\":null"), HasSubstr("a number is needed"));
-  EXPECT_THAT(HeaderRefusal("101", "68"), HasSubstr("\"landmarks\" is 68 instead of 101 or 165"));
+  EXPECT_THAT(HeaderRefusal("640", "99999999999999999999999"), HasSubstr("expected an integer"));
+  EXPECT_THAT(HeaderRefusal("\"fps\":30", "\"fps\":0"), HasSubstr("\"fps\" is not positive"));
+  EXPECT_THAT(HeaderRefusal("\"fps\":30", "\"fps\":null"), HasSubstr("expected a number"));
+  EXPECT_THAT(HeaderRefusal("101", "68"), HasSubstr("\"landmarks\" is 68, expected 101 or 165"));
   EXPECT_THAT(HeaderRefusal("\"degree\":0", "\"degree\":45"),
-              HasSubstr("\"degree\" is 45 instead of 0, 90, 180 or 270"));
+              HasSubstr("\"degree\" is 45, expected 0, 90, 180 or 270"));
   EXPECT_THAT(HeaderRefusal("\"degree\":0", "\"degree\":-90"), HasSubstr("\"degree\" is -90"));
   EXPECT_THAT(HeaderRefusal("\"degree\":0", "\"degree\":360"), HasSubstr("\"degree\" is 360"));
   EXPECT_THAT(HeaderRefusal("\"mirror\":0", "\"mirror\":2"), HasSubstr("\"mirror\" is 2, outside"));
-  EXPECT_THAT(HeaderRefusal("\"mirror\":0", "\"mirror\":true"), HasSubstr("whole number"));
-  EXPECT_THAT(HeaderRefusal("560.0", "0"), HasSubstr("\"focal\" is 0, below what is possible"));
-  EXPECT_THAT(HeaderRefusal("\"made up\"", "3"), HasSubstr("\"source\" is 3, a text is needed"));
+  EXPECT_THAT(HeaderRefusal("\"mirror\":0", "\"mirror\":true"), HasSubstr("expected an integer"));
+  EXPECT_THAT(HeaderRefusal("560.0", "0"), HasSubstr("\"focal\" is 0, expected at least 1"));
+  EXPECT_THAT(HeaderRefusal("\"made up\"", "3"), HasSubstr("\"source\" is 3, expected a string"));
 }
 
 TEST(TrackFile, RefusesFramesWithMissingFields) {
   EXPECT_THAT(FrameRefusal(R"({"faces":[]})"), HasSubstr(":3: field \"frame\" is missing"));
   EXPECT_THAT(FrameRefusal(R"({"frame":1})"), HasSubstr(":3: field \"faces\" is missing"));
-  EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":{}})"), HasSubstr("\"faces\" is {}, a list"));
-  EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[5]})"), HasSubstr("a face is not an object"));
+  EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":{}})"),
+              HasSubstr("\"faces\" is {}, expected an array"));
+  EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[5]})"),
+              HasSubstr("a face is 5, expected an object"));
   EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[{"points":[]}]})"),
               HasSubstr("field \"id\" is missing"));
   EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[{"id":3}]})"),
@@ -201,25 +245,41 @@ TEST(TrackFile, RefusesFramesWithMissingFields) {
 TEST(TrackFile, RefusesFramesOutOfOrder) {
   EXPECT_THAT(FrameRefusal(Frame(0, "")), HasSubstr(":3: frame 0 follows frame 0"));
   EXPECT_THAT(FrameRefusal(Frame(-1, "")), HasSubstr("\"frame\" is -1, outside"));
-  EXPECT_THAT(FrameRefusal(R"({"frame":"1","faces":[]})"), HasSubstr("whole number"));
+  EXPECT_THAT(FrameRefusal(R"({"frame":"1","faces":[]})"), HasSubstr("expected an integer"));
 }
 
 TEST(TrackFile, RefusesTheWrongNumberOfPoints) {
   EXPECT_THAT(FrameRefusal(Frame(1, Face(4, "", 201))),
-              HasSubstr(":3: \"points\" of face 4 has 201 numbers instead of 202"));
-  EXPECT_THAT(FrameRefusal(Frame(1, Face(4, "", 330))), HasSubstr("330 numbers instead of 202"));
+              HasSubstr(":3: \"points\" of face 4 has 201 numbers, expected 202"));
+  EXPECT_THAT(FrameRefusal(Frame(1, Face(4, "", 330))), HasSubstr("330 numbers, expected 202"));
   EXPECT_THAT(FrameRefusal(R"({"frame":1,"faces":[{"id":3,"points":7}]})"),
-              HasSubstr("\"points\" of face 3 is 7, a list is needed"));
+              HasSubstr("\"points\" of face 3 is 7, expected an array"));
 }
 
-TEST(TrackFile, RefusesPointsThatAreNotWholeNumbers) {
+TEST(TrackFile, RoundsFractionsHalfUp) {
+  const std::string face = Replaced(Face(4), "[0,1,2,3,4,5,6,", "[0.5,1.49,-2.5,-0.51,4e0,5.0,6,");
+  const Track track = Read(std::string(kHeader) + "\n" + Frame(0, face));
+  EXPECT_THAT(std::vector<int>(track.frames[0].faces[0].points.begin(),
+                               track.frames[0].faces[0].points.begin() + 8),
+              ::testing::ElementsAre(1, 1, -2, -1, 4, 5, 6, 7));
+  EXPECT_EQ(track.rounded_coordinates, 4u);  // 4e0 and 5.0 have no fraction
+  EXPECT_EQ(Read(std::string(kHeader) + "\n" + Frame(0, Face(4))).rounded_coordinates, 0u);
+}
+
+TEST(TrackFile, RefusesCoordinatesThatAreNoNumbersOrTooLarge) {
   const auto with = [](const std::string& value) {
     return FrameRefusal(Frame(1, Replaced(Face(4), "[0,1,2,", "[0,1," + value + ",")));
   };
-  EXPECT_THAT(with("2.5"), HasSubstr("a number of \"points\" of face 4 is 2.5, a whole number"));
-  EXPECT_THAT(with("\"2\""), HasSubstr("a whole number is needed"));
-  EXPECT_THAT(with("null"), HasSubstr("a whole number is needed"));
-  EXPECT_THAT(with("[2,3]"), HasSubstr("a whole number is needed"));
+  EXPECT_THAT(with("\"2\""),
+              HasSubstr("a number of \"points\" of face 4 is \"2\", expected a number"));
+  EXPECT_THAT(with("null"), HasSubstr("is null, expected a number"));
+  EXPECT_THAT(with("[2,3]"), HasSubstr("is [2,3], expected a number"));
+  EXPECT_THAT(with("NaN"), HasSubstr("not valid JSON"));
+  EXPECT_THAT(with("1e999"), HasSubstr("not valid JSON (a number is too large)"));
+  EXPECT_THAT(with("1e300"), HasSubstr("is 1e+300, outside"));
+  EXPECT_THAT(with("2147483647.5"), HasSubstr("outside"));
+  EXPECT_EQ(with("2147483647.4"), "");
+  EXPECT_THAT(with("-2147483648.6"), HasSubstr("outside"));
   EXPECT_THAT(with("2147483648"), HasSubstr("outside -2147483648 to 2147483647"));
   EXPECT_THAT(with("18446744073709551615"), HasSubstr("outside"));
   EXPECT_EQ(with("-2147483648"), "");
@@ -228,8 +288,7 @@ TEST(TrackFile, RefusesPointsThatAreNotWholeNumbers) {
 TEST(TrackFile, RefusesMoreThanFiveFacesAndTheSameFaceTwice) {
   std::string faces;
   for (int i = 0; i < 6; ++i) faces += (i == 0 ? "" : ",") + Face(i);
-  EXPECT_THAT(FrameRefusal(Frame(1, faces)),
-              HasSubstr(":3: a frame has 6 faces, at most 5 are possible"));
+  EXPECT_THAT(FrameRefusal(Frame(1, faces)), HasSubstr(":3: a frame has 6 faces (at most 5)"));
   EXPECT_THAT(FrameRefusal(Frame(1, Face(2) + "," + Face(2))),
               HasSubstr("face 2 appears twice in a frame"));
 }
@@ -240,13 +299,14 @@ TEST(TrackFile, RefusesDamagedTruth) {
   };
   EXPECT_THAT(with("\"rotation\"", "\"turn\""), HasSubstr("field \"rotation\" is missing"));
   EXPECT_THAT(with("\"translation\"", "\"shift\""), HasSubstr("field \"translation\" is missing"));
-  EXPECT_THAT(with(",0,0,0,-1]", ",0,0,-1]"), HasSubstr("8 numbers instead of 9"));
+  EXPECT_THAT(with(",0,0,0,-1]", ",0,0,-1]"), HasSubstr("8 numbers, expected 9"));
   EXPECT_THAT(with("[1,0,0", "[2,0,0"), HasSubstr("not a rotation matrix"));
   EXPECT_THAT(with("[1,0,0", "[-1,0,0"), HasSubstr("not a rotation matrix"));
-  EXPECT_THAT(with("[1,0,0", "[\"1\",0,0"), HasSubstr("a number is needed"));
+  EXPECT_THAT(with("[1,0,0", "[\"1\",0,0"), HasSubstr("expected a number"));
   EXPECT_THAT(with("800.25", "-800"), HasSubstr("behind the camera"));
-  EXPECT_THAT(with("]}", R"(],"points3d":[1,2]})"), HasSubstr("2 numbers instead of 303"));
-  EXPECT_THAT(FrameRefusal(Frame(1, Face(4, "\"truth\":5"))), HasSubstr("not an object but 5"));
+  EXPECT_THAT(with("]}", R"(],"points3d":[1,2]})"), HasSubstr("2 numbers, expected 303"));
+  EXPECT_THAT(FrameRefusal(Frame(1, Face(4, "\"truth\":5"))),
+              HasSubstr("\"truth\" is 5, expected an object"));
   EXPECT_THAT(Refusal(Replaced(kHeader, "\"focal\":560.0,", "") + "\n" + Frame(0, Face(4, kTruth))),
               HasSubstr("a face has \"truth\" but the header has no \"focal\""));
 }

@@ -3,7 +3,7 @@
 
 #include <algorithm>
 #include <cmath>
-#include <fstream>
+#include <iostream>
 #include <limits>
 #include <nlohmann/json.hpp>
 #include <set>
@@ -20,7 +20,6 @@ class Place {
  public:
   explicit Place(std::string file) : file_(std::move(file)) {}
   void NextLine() { ++line_; }
-  std::size_t line() const { return line_; }
 
   [[noreturn]] void Fail(const std::string& sentence) const {
     throw TrackError(file_ + ":" + std::to_string(line_) + ": " + sentence);
@@ -45,12 +44,11 @@ const json& Field(const Place& place, const json& object, const char* name) {
   return *found;
 }
 
-// A whole number within [low, high]. 3.0 is not one: a detector that writes fractions writes
-// another format, and rounding silently would hide that.
+// An integer within [low, high]; 3.0 is not one.
 std::int64_t Whole(const Place& place, const json& value, const std::string& what, std::int64_t low,
                    std::int64_t high) {
   if (!value.is_number_integer()) {
-    place.Fail(what + " is " + Shown(value) + ", a whole number is needed");
+    place.Fail(what + " is " + Shown(value) + ", expected an integer");
   }
   const bool too_large =
       value.is_number_unsigned() && value.get<std::uint64_t>() > static_cast<std::uint64_t>(high);
@@ -62,14 +60,14 @@ std::int64_t Whole(const Place& place, const json& value, const std::string& wha
 }
 
 double Number(const Place& place, const json& value, const std::string& what) {
-  if (!value.is_number()) place.Fail(what + " is " + Shown(value) + ", a number is needed");
+  if (!value.is_number()) place.Fail(what + " is " + Shown(value) + ", expected a number");
   const double number = value.get<double>();
   if (!std::isfinite(number)) place.Fail(what + " is not a finite number");
   return number;
 }
 
 std::string Text(const Place& place, const json& value, const std::string& what) {
-  if (!value.is_string()) place.Fail(what + " is " + Shown(value) + ", a text is needed");
+  if (!value.is_string()) place.Fail(what + " is " + Shown(value) + ", expected a string");
   return value.get<std::string>();
 }
 
@@ -79,12 +77,15 @@ std::optional<double> OptionalNumber(const Place& place, const json& object, con
   if (found == object.end()) return std::nullopt;
   const std::string what = std::string("\"") + name + "\"";
   const double number = Number(place, *found, what);
-  if (number < low) place.Fail(what + " is " + Shown(*found) + ", below what is possible");
+  if (number < low) {
+    place.Fail(what + " is " + Shown(*found) + ", expected at least " +
+               std::to_string(static_cast<int>(low)));
+  }
   return number;
 }
 
 const json& List(const Place& place, const json& value, const std::string& what) {
-  if (!value.is_array()) place.Fail(what + " is " + Shown(value) + ", a list is needed");
+  if (!value.is_array()) place.Fail(what + " is " + Shown(value) + ", expected an array");
   return value;
 }
 
@@ -92,7 +93,7 @@ std::vector<double> Numbers(const Place& place, const json& value, const std::st
                             std::size_t count) {
   List(place, value, what);
   if (value.size() != count) {
-    place.Fail(what + " has " + std::to_string(value.size()) + " numbers instead of " +
+    place.Fail(what + " has " + std::to_string(value.size()) + " numbers, expected " +
                std::to_string(count));
   }
   std::vector<double> numbers;
@@ -101,8 +102,28 @@ std::vector<double> Numbers(const Place& place, const json& value, const std::st
   return numbers;
 }
 
+// How deep arrays and objects lie in each other.
+std::size_t Nesting(const std::string& line) {
+  std::size_t depth = 0;
+  std::size_t deepest = 0;
+  bool in_string = false;
+  for (std::size_t i = 0; i < line.size(); ++i) {
+    const char letter = line[i];
+    if (letter == '"') in_string = !in_string;
+    if (letter == '\\') ++i;  // what it escapes
+    if (in_string) continue;
+    if (letter == '[' || letter == '{') deepest = std::max(deepest, ++depth);
+    if ((letter == ']' || letter == '}') && depth > 0) --depth;
+  }
+  return deepest;
+}
+
 json ParseLine(const Place& place, const std::string& line) {
   if (line.find_first_not_of(" \t\r") == std::string::npos) place.Fail("the line is empty");
+  // Values are shown and released by recursion, which a hostile line would let overflow the stack.
+  if (Nesting(line) > kMaxTrackNesting) {
+    place.Fail("nested more than " + std::to_string(kMaxTrackNesting) + " levels deep");
+  }
   json value;
   try {
     value = json::parse(line);
@@ -111,7 +132,7 @@ json ParseLine(const Place& place, const std::string& line) {
   } catch (const json::exception&) {
     place.Fail("not valid JSON (a number is too large)");
   }
-  if (!value.is_object()) place.Fail("not a JSON object but " + Shown(value));
+  if (!value.is_object()) place.Fail("the line is " + Shown(value) + ", expected an object");
   return value;
 }
 
@@ -123,7 +144,7 @@ TrackHeader ParseHeader(const Place& place, const json& object) {
   const std::int64_t version =
       Whole(place, Field(place, object, "version"), "\"version\"",
             std::numeric_limits<std::int64_t>::min(), std::numeric_limits<std::int64_t>::max());
-  if (version != 1) place.Fail("version " + std::to_string(version) + " is not known, only 1 is");
+  if (version != 1) place.Fail("unsupported version " + std::to_string(version) + " (expected 1)");
 
   const auto whole = [&](const char* name, std::int64_t low, std::int64_t high) {
     const std::string what = std::string("\"") + name + "\"";
@@ -133,14 +154,14 @@ TrackHeader ParseHeader(const Place& place, const json& object) {
   header.width = whole("width", 1, kMaxTrackImageSize);
   header.height = whole("height", 1, kMaxTrackImageSize);
   header.fps = Number(place, Field(place, object, "fps"), "\"fps\"");
-  if (header.fps <= 0) place.Fail("\"fps\" is not above 0");
+  if (header.fps <= 0) place.Fail("\"fps\" is not positive");
   header.landmarks = whole("landmarks", 0, 100000);
   if (header.landmarks != 101 && header.landmarks != 165) {
-    place.Fail("\"landmarks\" is " + std::to_string(header.landmarks) + " instead of 101 or 165");
+    place.Fail("\"landmarks\" is " + std::to_string(header.landmarks) + ", expected 101 or 165");
   }
   header.degree = whole("degree", -100000, 100000);
   if (header.degree % 90 != 0 || header.degree < 0 || header.degree > 270) {
-    place.Fail("\"degree\" is " + std::to_string(header.degree) + " instead of 0, 90, 180 or 270");
+    place.Fail("\"degree\" is " + std::to_string(header.degree) + ", expected 0, 90, 180 or 270");
   }
   header.mirror = whole("mirror", 0, 1);
   header.source = Text(place, Field(place, object, "source"), "\"source\"");
@@ -168,7 +189,7 @@ bool IsRotation(const std::array<double, 9>& r) {
 }
 
 TrackTruth ParseTruth(const Place& place, const json& object, const TrackHeader& header) {
-  if (!object.is_object()) place.Fail("\"truth\" is not an object but " + Shown(object));
+  if (!object.is_object()) place.Fail("\"truth\" is " + Shown(object) + ", expected an object");
   if (!header.focal) place.Fail("a face has \"truth\" but the header has no \"focal\"");
   TrackTruth truth;
   const auto rotation = Numbers(place, Field(place, object, "rotation"), "\"rotation\"", 9);
@@ -185,8 +206,27 @@ TrackTruth ParseTruth(const Place& place, const json& object, const TrackHeader&
   return truth;
 }
 
-TrackFace ParseFace(const Place& place, const json& object, const TrackHeader& header) {
-  if (!object.is_object()) place.Fail("a face is not an object but " + Shown(object));
+// A landmark's coordinate, rounded to integer pixels; `rounded` counts the fractions.
+std::int32_t Coordinate(const Place& place, const json& value, const std::string& what,
+                        std::size_t& rounded) {
+  constexpr std::int32_t kLow = std::numeric_limits<std::int32_t>::min();
+  constexpr std::int32_t kHigh = std::numeric_limits<std::int32_t>::max();
+  if (value.is_number_integer()) {
+    return static_cast<std::int32_t>(Whole(place, value, what, kLow, kHigh));
+  }
+  const double exact = Number(place, value, what);
+  const double pixel = std::floor(exact + 0.5);
+  if (pixel < kLow || pixel > kHigh) {
+    place.Fail(what + " is " + Shown(value) + ", outside " + std::to_string(kLow) + " to " +
+               std::to_string(kHigh));
+  }
+  if (pixel != exact) ++rounded;
+  return static_cast<std::int32_t>(pixel);
+}
+
+TrackFace ParseFace(const Place& place, const json& object, const TrackHeader& header,
+                    std::size_t& rounded) {
+  if (!object.is_object()) place.Fail("a face is " + Shown(object) + ", expected an object");
   TrackFace face;
   face.id =
       Whole(place, Field(place, object, "id"), "a face's \"id\"",
@@ -195,31 +235,30 @@ TrackFace ParseFace(const Place& place, const json& object, const TrackHeader& h
   const json& points = List(place, Field(place, object, "points"), points_name);
   const std::size_t expected = 2 * static_cast<std::size_t>(header.landmarks);
   if (points.size() != expected) {
-    place.Fail(points_name + " has " + std::to_string(points.size()) + " numbers instead of " +
+    place.Fail(points_name + " has " + std::to_string(points.size()) + " numbers, expected " +
                std::to_string(expected));
   }
   face.points.reserve(expected);
   for (const json& item : points) {
-    face.points.push_back(static_cast<std::int32_t>(
-        Whole(place, item, "a number of " + points_name, std::numeric_limits<std::int32_t>::min(),
-              std::numeric_limits<std::int32_t>::max())));
+    face.points.push_back(Coordinate(place, item, "a number of " + points_name, rounded));
   }
   if (object.contains("truth")) face.truth = ParseTruth(place, object["truth"], header);
   return face;
 }
 
-TrackFrame ParseFrame(const Place& place, const json& object, const TrackHeader& header) {
+TrackFrame ParseFrame(const Place& place, const json& object, const TrackHeader& header,
+                      std::size_t& rounded) {
   TrackFrame frame;
   frame.number = Whole(place, Field(place, object, "frame"), "\"frame\"", 0,
                        std::numeric_limits<std::int32_t>::max());
   const json& faces = List(place, Field(place, object, "faces"), "\"faces\"");
   if (faces.size() > kMaxTrackFaces) {
-    place.Fail("a frame has " + std::to_string(faces.size()) + " faces, at most " +
-               std::to_string(kMaxTrackFaces) + " are possible");
+    place.Fail("a frame has " + std::to_string(faces.size()) + " faces (at most " +
+               std::to_string(kMaxTrackFaces) + ")");
   }
   std::set<std::int64_t> ids;
   for (const json& item : faces) {
-    frame.faces.push_back(ParseFace(place, item, header));
+    frame.faces.push_back(ParseFace(place, item, header, rounded));
     if (!ids.insert(frame.faces.back().id).second) {
       place.Fail("face " + std::to_string(frame.faces.back().id) + " appears twice in a frame");
     }
@@ -232,7 +271,12 @@ bool ReadLine(std::istream& in, const Place& place, std::string& line) {
   line.clear();
   std::streambuf* buffer = in.rdbuf();
   for (;;) {
-    const int c = buffer->sbumpc();
+    int c = 0;
+    try {
+      c = buffer->sbumpc();
+    } catch (const std::ios_base::failure&) {
+      place.Fail("the line cannot be read");
+    }
     if (c == std::char_traits<char>::eof()) {
       in.setstate(std::ios::eofbit);
       return !line.empty();
@@ -241,16 +285,6 @@ bool ReadLine(std::istream& in, const Place& place, std::string& line) {
     if (line.size() == kMaxTrackLine) place.Fail("the line is longer than a frame can be");
     line.push_back(static_cast<char>(c));
   }
-}
-
-std::string TrackName(const std::string& path) {
-  std::string name = path.substr(path.find_last_of('/') + 1);
-  const std::string ending = ".track.jsonl";
-  if (name.size() > ending.size() &&
-      name.compare(name.size() - ending.size(), ending.size(), ending) == 0) {
-    name.resize(name.size() - ending.size());
-  }
-  return name;
 }
 
 // Rounded to multiples of 1 / per_unit, so that the shortest form of each double is short.
@@ -287,34 +321,80 @@ std::size_t Track::MostFaces() const {
   return most;
 }
 
+std::string TrackName(const std::string& path) {
+  std::string name = path.substr(path.find_last_of('/') + 1);
+  const std::string ending = ".track.jsonl";
+  if (name.size() > ending.size() &&
+      name.compare(name.size() - ending.size(), ending.size(), ending) == 0) {
+    name.resize(name.size() - ending.size());
+  }
+  return name;
+}
+
+struct TrackReader::State {
+  std::istream& in;
+  Place place;
+  std::string line;
+  TrackHeader header;
+  std::int64_t last_number = -1;  // of the frame before; frame numbers are not negative
+  std::size_t rounded = 0;
+};
+
+TrackReader::TrackReader(std::istream& in, const std::string& name)
+    : name_(name), state_(new State{in, Place(name), {}, {}}) {
+  state_->place.NextLine();
+  if (!ReadLine(in, state_->place, state_->line)) throw TrackError(name + ": the file is empty");
+  state_->header = ParseHeader(state_->place, ParseLine(state_->place, state_->line));
+}
+
+TrackReader::~TrackReader() = default;
+
+const TrackHeader& TrackReader::header() const { return state_->header; }
+
+std::size_t TrackReader::rounded_coordinates() const { return state_->rounded; }
+
+std::optional<TrackFrame> TrackReader::Next() {
+  const Place& place = state_->place;
+  state_->place.NextLine();
+  if (!ReadLine(state_->in, place, state_->line)) {
+    if (state_->last_number < 0) throw TrackError(name_ + ": the file contains no frames");
+    return std::nullopt;
+  }
+  TrackFrame frame =
+      ParseFrame(place, ParseLine(place, state_->line), state_->header, state_->rounded);
+  if (frame.number <= state_->last_number) {
+    place.Fail("frame " + std::to_string(frame.number) + " follows frame " +
+               std::to_string(state_->last_number));
+  }
+  state_->last_number = frame.number;
+  return frame;
+}
+
 Track ReadTrack(std::istream& in, const std::string& name) {
-  Place place(name);
+  TrackReader reader(in, name);
   Track track;
   track.name = TrackName(name);
-  std::string line;
-  place.NextLine();
-  if (!ReadLine(in, place, line)) throw TrackError(name + ": the file is empty");
-  track.header = ParseHeader(place, ParseLine(place, line));
-  for (place.NextLine(); ReadLine(in, place, line); place.NextLine()) {
-    TrackFrame frame = ParseFrame(place, ParseLine(place, line), track.header);
-    if (!track.frames.empty() && frame.number <= track.frames.back().number) {
-      place.Fail("frame " + std::to_string(frame.number) + " follows frame " +
-                 std::to_string(track.frames.back().number));
-    }
-    track.frames.push_back(std::move(frame));
+  track.header = reader.header();
+  while (std::optional<TrackFrame> frame = reader.Next()) {
+    track.frames.push_back(std::move(*frame));
   }
-  if (in.bad()) throw TrackError(name + ": the file cannot be read to its end");
-  if (track.frames.empty()) throw TrackError(name + ": there is a header but no frame");
+  track.rounded_coordinates = reader.rounded_coordinates();
   return track;
 }
 
-Track ReadTrackFile(const std::string& path) {
-  std::ifstream in(path, std::ios::binary);
+TrackInput::TrackInput(const std::string& path)
+    : name_(path == "-" ? "standard input" : path), in_(path == "-" ? &std::cin : &file_) {
+  if (path == "-") return;
+  file_.open(path, std::ios::binary);
   // A folder opens, but nothing can be read from it.
-  if (!in || (in.peek() == std::char_traits<char>::eof() && in.bad())) {
+  if (!file_ || (file_.peek() == std::char_traits<char>::eof() && file_.bad())) {
     throw TrackError(path + ": the file cannot be opened");
   }
-  return ReadTrack(in, path);
+}
+
+Track ReadTrackFile(const std::string& path) {
+  TrackInput input(path);
+  return ReadTrack(input.stream(), input.name());
 }
 
 void WriteTrack(std::ostream& out, const Track& track) {

@@ -4,7 +4,8 @@
 // Line 1 is the header, every further line one frame; docs in examples/tracks/README.md. The reader
 // trusts nothing: whatever is wrong with a file is reported as "FILE:LINE: one sentence".
 //
-// Frames: points are whole pixels of the picture as delivered, before it is un-mirrored and turned.
+// Frames: points are integer pixels of the image as delivered, before it is un-mirrored and turned.
+// Fractions are rounded to floor(x + 0.5), because the engine takes integers.
 // Truth is in the upright, unmirrored camera frame (x right, y down, z forward, mm) and its
 // landmark numbering; it takes the head frame (x to the image right, y up, z out of the face) to
 // the camera.
@@ -13,7 +14,9 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <fstream>
 #include <istream>
+#include <memory>
 #include <optional>
 #include <ostream>
 #include <string>
@@ -26,6 +29,7 @@ namespace n3ds::tool {
 constexpr std::size_t kMaxTrackFaces = 5;       // what the engine accepts in one frame
 constexpr int kMaxTrackImageSize = 16384;       // pixels a side; beyond it a header is damaged
 constexpr std::size_t kMaxTrackLine = 1 << 20;  // bytes; the longest real line has about 60,000
+constexpr std::size_t kMaxTrackNesting = 64;    // arrays and objects; a frame has 5 levels
 
 struct TrackTruth {
   std::array<double, 9> rotation{};     // row-major, head to camera
@@ -66,6 +70,7 @@ struct Track {
   std::string name;  // file name without folder and .track.jsonl
   TrackHeader header;
   std::vector<TrackFrame> frames;  // at least one
+  std::size_t rounded_coordinates = 0;
 
   bool HasTruth() const;          // every face has truth and the focal length is known
   std::size_t FaceCount() const;  // face entries over all frames
@@ -79,7 +84,46 @@ class TrackError : public Error {
   using Error::Error;
 };
 
-// Reads a whole track. `name` stands for the file in messages.
+// Reads a track frame by frame, each when its line has arrived.
+class TrackReader {
+ public:
+  // Reads the header. `name` stands for the file in messages.
+  TrackReader(std::istream& in, const std::string& name);
+  ~TrackReader();
+  TrackReader(const TrackReader&) = delete;
+  TrackReader& operator=(const TrackReader&) = delete;
+
+  const TrackHeader& header() const;
+  // Nothing at the end of the file, which must not come before the first frame.
+  std::optional<TrackFrame> Next();
+  // Coordinates with a fraction so far.
+  std::size_t rounded_coordinates() const;
+
+ private:
+  struct State;
+  std::string name_;
+  std::unique_ptr<State> state_;
+};
+
+// A file with a track, or standard input for "-".
+class TrackInput {
+ public:
+  // Throws TrackError when it cannot be opened.
+  explicit TrackInput(const std::string& path);
+
+  std::istream& stream() { return *in_; }
+  const std::string& name() const { return name_; }
+
+ private:
+  std::string name_;
+  std::ifstream file_;
+  std::istream* in_;
+};
+
+// The file name without folder and .track.jsonl.
+std::string TrackName(const std::string& path);
+
+// Reads a whole track.
 Track ReadTrack(std::istream& in, const std::string& name);
 Track ReadTrackFile(const std::string& path);
 
