@@ -22,6 +22,7 @@
 #include "eval/metrics.h"
 #include "eval/score_table.h"
 #include "one_euro_pose.h"
+#include "support/data_files.h"
 #include "support/error.h"
 #include "support/statistics.h"
 #include "tracks/track_file.h"

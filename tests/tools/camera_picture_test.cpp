@@ -12,6 +12,7 @@
 #include "engine/engine_session.h"
 #include "norvale_3d_sticker_engine.h"
 #include "render/scene.h"
+#include "support/data_files.h"
 
 namespace n3ds::tool {
 namespace {

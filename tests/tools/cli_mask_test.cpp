@@ -239,6 +239,22 @@ TEST_F(CliMask, RefusesWhatItCannotUse) {
                 kUsage, "--settle");
 }
 
+TEST_F(CliMask, WritesWhatTheEndingAsksFor) {
+  const std::string photo = Save("photo.png", Plain(512, 512, 128));
+  const std::string texture = Save("texture.png", FourColours());
+  const auto mask = [&](const std::string& out) {
+    return std::vector<std::string>{"mask", photo, astronaut_, "--texture", texture, "--out", out};
+  };
+  const Outcome outcome = Run(mask(folder_.Path("a.jpg")));
+  EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
+  EXPECT_EQ(folder_.Read("a.jpg").substr(0, 2), "\xff\xd8");
+  EXPECT_EQ(ReadPicture(folder_.Path("a.jpg")).width, 512);
+  ExpectFailure(mask(folder_.Path("a.gif")), kUsage,
+                "a.gif: unknown ending .gif (known: .png, .jpg, .jpeg)", {"a.jpg"});
+  ExpectFailure(mask(photo), kUsage, "is also an input", {"a.jpg"});
+  ExpectFailure(mask(texture), kUsage, "is also an input", {"a.jpg"});
+}
+
 struct Obj {
   std::vector<std::string> names;
   std::vector<std::array<double, 3>> vertices;

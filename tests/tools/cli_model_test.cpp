@@ -138,12 +138,12 @@ TEST_F(CliModel, RefusesWhatItCannotMake) {
     ExpectFailure(arguments, exit_code, text);
   };
   for (const char* text : {"1", "1=", "1=x", "1=9", "1=nan", "1=2z", "=1"}) {
-    render({"--identity", text}, kFailed, std::string("--identity ") + text + ": ");
+    render({"--identity", text}, kUsage, std::string("--identity ") + text + ": ");
   }
-  render({"--identity", "17=1"}, kFailed, "--identity 17=1: there are modes 1 to 16");
-  render({"--identity", "0=1"}, kFailed, "there are modes 1 to 16");
-  render({"--expression", "smirk=1"}, kFailed, "there is no expression 'smirk'");
-  render({"--expression", "jaw_open=3"}, kFailed, "a value from -2 to 2 is needed");
+  render({"--identity", "17=1"}, kUsage, "--identity 17=1: there are modes 1 to 16");
+  render({"--identity", "0=1"}, kUsage, "there are modes 1 to 16");
+  render({"--expression", "smirk=1"}, kUsage, "there is no expression 'smirk'");
+  render({"--expression", "jaw_open=3"}, kUsage, "expected NAME=VALUE with a value from -2 to 2");
   render({"--views", "0"}, kUsage, "--views");
   render({"--size", "9"}, kUsage, "--size");
   ExpectFailure({"model", "render", kModel}, kUsage, "--out");
@@ -156,9 +156,28 @@ TEST_F(CliModel, RefusesWhatItCannotMake) {
   for (const char* command : {"check", "render", "export"}) {
     std::vector<std::string> arguments = {"model", command, broken};
     if (command == std::string("render")) arguments.insert(arguments.end(), {"--out", out});
-    if (command == std::string("export")) arguments.insert(arguments.end(), {"--obj", out});
+    if (command == std::string("export")) {
+      arguments.insert(arguments.end(), {"--obj", folder_.Path("a.obj")});
+    }
     ExpectFailure(arguments, kFailed, "m.bin: a face model has 2141796 bytes, this file has 8");
   }
+}
+
+TEST_F(CliModel, RefusesEndingsItCannotWrite) {
+  ExpectFailure({"model", "render", kModel, "--out", folder_.Path("a.tiff")}, kUsage,
+                "a.tiff: unknown ending .tiff (known: .png, .jpg, .jpeg)");
+  ExpectFailure({"model", "render", kModel, "--out", folder_.Path("a")}, kUsage, "a: no ending");
+  ExpectFailure({"model", "export", kModel, "--obj", folder_.Path("a.stl")}, kUsage,
+                "a.stl: unknown ending .stl (known: .obj)");
+}
+
+TEST_F(CliModel, RefusesToReplaceTheModel) {
+  std::filesystem::copy_file(kModel, console_.Path("m.obj"));
+  std::filesystem::create_symlink("m.obj", console_.Path("m.png"));
+  ExpectFailure({"model", "export", console_.Path("m.obj"), "--obj", console_.Path("m.obj")},
+                kUsage, "is also an input");
+  ExpectFailure({"model", "render", console_.Path("m.obj"), "--out", console_.Path("m.png")},
+                kUsage, "is also an input");
 }
 
 TEST_F(CliModel, HelpShowsExamples) {

@@ -85,12 +85,12 @@ TEST_F(CliRender, RefusesWhatItCannotDraw) {
   const std::string png = folder_.Path("a.png");
   ExpectFailure({"render", track, "--out", png, "--frame", "999"}, kFailed,
                 "there is no frame 999");
-  ExpectFailure({"render", track, "--out", png, "--frame", "1", "--contact-sheet", "4"}, kFailed,
+  ExpectFailure({"render", track, "--out", png, "--frame", "1", "--contact-sheet", "4"}, kUsage,
                 "exclude each other");
-  ExpectFailure({"render", track, "--out", folder_.Path("a.mp4"), "--frame", "1"}, kFailed,
-                "must end in .png");
+  ExpectFailure({"render", track, "--out", folder_.Path("a.mp4"), "--frame", "1"}, kUsage,
+                "must end in .png or .jpg");
   for (const char* size : {"0x0", "100", "axb", "100x100x", "99999x10"}) {
-    ExpectFailure({"render", track, "--out", png, "--size", size}, kFailed, "--size ");
+    ExpectFailure({"render", track, "--out", png, "--size", size}, kUsage, "--size ");
   }
   ExpectFailure({"render", track, "--out", png, "--image", track}, kFailed,
                 "neither a PNG nor a JPEG");
@@ -102,6 +102,71 @@ TEST_F(CliRender, RefusesWhatItCannotDraw) {
   ExpectFailure({"render", Damaged(2, "?"), "--out", png}, kFailed, ":2: not valid JSON");
   ExpectFailure({"render", track, "--out", folder_.Path("missing/a.png")}, kFailed,
                 "missing/a.png: cannot be written");
+}
+
+TEST_F(CliRender, WritesJpegWhereJpegIsAskedFor) {
+  const std::string track = ExampleTrack("real_man_270_mirror");
+  const auto draw = [&](const std::string& name) {
+    const Outcome outcome =
+        Run({"render", track, "--size", "200x200", "--out", folder_.Path(name)});
+    EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
+    return ReadPicture(folder_.Path(name));
+  };
+  const Picture png = draw("a.png");
+  for (const char* name : {"a.jpg", "b.JPEG"}) {
+    const Picture jpeg = draw(name);
+    EXPECT_EQ(folder_.Read(name).substr(0, 2), "\xff\xd8");
+    ASSERT_EQ(jpeg.rgba.size(), png.rgba.size());
+    double difference = 0;
+    for (std::size_t i = 0; i < png.rgba.size(); ++i) {
+      difference += std::abs(int{png.rgba[i]} - int{jpeg.rgba[i]});
+    }
+    EXPECT_LT(difference / static_cast<double>(png.rgba.size()), 3);
+  }
+}
+
+TEST_F(CliRender, RefusesEndingsItCannotWrite) {
+  const std::string track = ExampleTrack("real_man_270_mirror");
+  for (const std::string ending : {".gif", ".webm", ".mov", ".pgn"}) {
+    ExpectFailure(
+        {"render", track, "--out", folder_.Path("x" + ending)}, kUsage,
+        "unknown ending " + ending + " (known: .png, .jpg, .jpeg, .mp4; a folder has none)");
+  }
+  // A folder that is there, or a slash, says what is meant.
+  std::filesystem::create_directory(console_.Path("frames.v1"));
+  for (const std::string& out : {console_.Path("frames.v1"), console_.Path("frames.v2/")}) {
+    EXPECT_EQ(Run({"render", track, "--every", "30", "--size", "32x32", "--out", out}).exit_code,
+              0);
+    EXPECT_TRUE(std::filesystem::exists(out + "/frame_000030.png"));
+  }
+}
+
+TEST_F(CliRender, RefusesToReplaceItsInput) {
+  const std::string track = ExampleTrack("photo_astronaut");
+  WritePng(console_.Path("photo.png"), Picture(512, 512));
+  std::filesystem::create_symlink("photo.png", console_.Path("link.png"));
+  ExpectFailure(
+      {"render", track, "--image", console_.Path("photo.png"), "--out", console_.Path("link.png")},
+      kUsage, "is also an input");
+  ExpectFailure({"render", track, "--mode", "mask", "--texture", console_.Path("photo.png"),
+                 "--out", console_.Path("photo.png")},
+                kUsage, "is also an input");
+}
+
+// What a user of stickers wants to see; landmarks and axes are for those who debug.
+TEST_F(CliRender, DrawsStickersAlone) {
+  const auto draw = [&](const std::vector<std::string>& more) {
+    std::vector<std::string> arguments = {"render", ExampleTrack("photo_astronaut"),
+                                          "--size", "300x300",
+                                          "--out",  folder_.Path("a.png")};
+    arguments.insert(arguments.end(), more.begin(), more.end());
+    EXPECT_EQ(Run(arguments).exit_code, 0);
+    return ReadPicture(folder_.Path("a.png")).rgba;
+  };
+  const auto plain = draw({});
+  EXPECT_EQ(plain, draw({"--draw", "hat,glasses,head"}));
+  EXPECT_NE(plain, draw({"--draw", "hat,glasses,head,landmarks"}));
+  EXPECT_NE(plain, draw({"--draw", "hat,glasses,head,axes"}));
 }
 
 TEST_F(CliRender, DrawsTheDenseMesh) {
@@ -138,9 +203,9 @@ TEST_F(CliRender, DenseMeshesNeedMaskMode) {
   const std::string png = folder_.Path("a.png");
   const std::string mask = N3DS_SOURCE_DIR "/examples/assets/mask_tiger.png";
   for (const char* part : {"mesh", "wireframe", "hat,wireframe"}) {
-    ExpectFailure({"render", track, "--out", png, "--draw", part}, kFailed, "need the dense mesh");
+    ExpectFailure({"render", track, "--out", png, "--draw", part}, kUsage, "need the dense mesh");
   }
-  ExpectFailure({"render", track, "--out", png, "--texture", mask}, kFailed, "need the dense mesh");
+  ExpectFailure({"render", track, "--out", png, "--texture", mask}, kUsage, "need the dense mesh");
   ExpectFailure({"render", track, "--out", png, "--mode", "mask", "--texture", track}, kFailed,
                 "neither a PNG nor a JPEG");
   ExpectFailure(

@@ -11,6 +11,7 @@
 
 #include "engine/engine_session.h"
 #include "mesh/face_tables.h"
+#include "support/data_files.h"
 #include "support/statistics.h"
 
 namespace n3ds::tool {

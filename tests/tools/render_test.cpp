@@ -18,6 +18,7 @@
 #include "render/shapes.h"
 #include "render/view.h"
 #include "scratch_folder.h"
+#include "support/data_files.h"
 #include "tracks/upright.h"
 
 namespace n3ds::tool {

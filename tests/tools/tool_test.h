@@ -61,7 +61,8 @@ class ToolTest : public ::testing::Test {
     for (const int signal : {SIGINT, SIGTERM, SIGHUP}) sigaddset(&restored, signal);
     posix_spawnattr_setsigdefault(&attributes, &restored);
     posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
-    const int failure = posix_spawn(&child, N3DS_TOOL, &actions, &attributes, argv.data(), environ);
+    const int failure =
+        posix_spawn(&child, tool_.c_str(), &actions, &attributes, argv.data(), environ);
     posix_spawnattr_destroy(&attributes);
     posix_spawn_file_actions_destroy(&actions);
     return failure == 0 ? child : -1;
@@ -145,6 +146,7 @@ class ToolTest : public ::testing::Test {
 
   ScratchFolder folder_;
   ScratchFolder console_;
+  std::string tool_ = N3DS_TOOL;
   std::string stdout_;  // where standard output goes instead of a file
 };
 

@@ -11,7 +11,9 @@
 #include <vector>
 
 #include "commands/commands.h"
+#include "commands/frames.h"
 #include "commands/options.h"
+#include "commands/outputs.h"
 #include "engine/engine_session.h"
 #include "engine/face_model_file.h"
 #include "eval/mesh_metrics.h"
@@ -31,10 +33,14 @@ struct EvalOptions {
 };
 
 void RunEvalCommand(const EvalOptions& options) {
+  const std::string model = options.engine.model_path();
+  std::vector<std::string> inputs = options.tracks;
+  inputs.push_back(model);
+  CheckIsNoInput(options.csv, inputs);
   std::vector<Track> tracks;
   std::size_t frames = 0;
   for (const std::string& path : options.tracks) {
-    tracks.push_back(ReadTrackFile(path));
+    tracks.push_back(LoadTrack(path));
     if (!tracks.back().HasTruth()) {
       throw Error(path + ": the track has no truth to compare with");
     }
@@ -45,7 +51,7 @@ void RunEvalCommand(const EvalOptions& options) {
   std::vector<MeshScore> meshes;
   std::optional<MeshJudge> judge;
   if (options.engine.mode() == TrackMode::kMask) {
-    judge.emplace(ReadFaceModelFile(options.engine.model));
+    judge.emplace(ReadFaceModelFile(model));
     meshes.resize(tracks.size());
   }
   {
@@ -56,8 +62,7 @@ void RunEvalCommand(const EvalOptions& options) {
         if (judge) judge->AddFrame(track.header, track.frames[f], result, meshes[k]);
         progress.Step();
       };
-      poses.push_back(
-          CameraPoses(track, RunTrack(track, options.engine.model, options.engine.mode(), use)));
+      poses.push_back(CameraPoses(track, RunTrack(track, model, options.engine.mode(), use)));
     }
   }
   std::vector<JudgedTrack> judged;
@@ -89,10 +94,10 @@ void AddEvalCommand(CLI::App& app) {
       "eval",
       "Runs tracks that have truth through the engine and prints how far its poses are off.");
   const auto options = std::make_shared<EvalOptions>();
-  command->add_option("tracks", options->tracks, "Landmark tracks with truth")
+  command->add_option("TRACKS", options->tracks, "Landmark tracks with truth (FILE.track.jsonl)")
       ->required()
-      ->type_name("FILE.track.jsonl");
-  command->add_option("--csv", options->csv, "The table as CSV")->type_name("FILE");
+      ->type_name("");
+  AddFileOption(*command, "--csv", options->csv, "The table as CSV, with all columns");
   AddEngineOptions(*command, options->engine);
   command->footer(
       std::string("Columns:\n") + kScoreTableLegend + "With --mode mask also:\n" +

@@ -3,15 +3,18 @@
 
 #include <cstdio>
 #include <filesystem>
+#include <utility>
 #include <vector>
 
+#include "commands/outputs.h"
 #include "support/error.h"
 
 namespace n3ds::tool {
 
 namespace fs = std::filesystem;
 
-FrameFolder::FrameFolder(const std::string& path) : path_(path) {
+FrameFolder::FrameFolder(const std::string& path, std::vector<std::string> inputs)
+    : path_(path), inputs_(std::move(inputs)) {
   std::vector<fs::path> missing;
   std::error_code error;
   for (fs::path folder = path; !folder.empty() && !fs::exists(folder, error);
@@ -35,6 +38,7 @@ std::string FrameFolder::File(std::int64_t number, const char* ending) {
   char name[32];
   std::snprintf(name, sizeof name, "frame_%06lld%s", static_cast<long long>(number), ending);
   std::string file = (fs::path(path_) / name).string();
+  CheckIsNoInput(file, inputs_);
   std::error_code error;
   if (!fs::exists(fs::symlink_status(file, error))) {
     made_.emplace_back(file, Unfinished::Kind::kFile);

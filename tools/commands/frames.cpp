@@ -1,9 +1,23 @@
 // SPDX-License-Identifier: MIT
 #include "commands/frames.h"
 
+#include <cstdio>
+
 #include "support/error.h"
 
 namespace n3ds::tool {
+
+Track LoadTrack(const std::string& path) {
+  Track track = ReadTrackFile(path);
+  TellRounding(path, track.rounded_coordinates);
+  return track;
+}
+
+void TellRounding(const std::string& path, std::size_t rounded_coordinates) {
+  if (rounded_coordinates == 0) return;
+  std::fprintf(stderr, "n3ds: %s: %zu coordinates with fractions rounded to floor(x + 0.5)\n",
+               path.c_str(), rounded_coordinates);
+}
 
 std::size_t ChosenFrame(const Track& track, const std::string& path,
                         const std::optional<std::int64_t>& number) {

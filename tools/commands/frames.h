@@ -12,6 +12,10 @@
 
 namespace n3ds::tool {
 
+// Reads a track and tells on standard error when coordinates had to be rounded. Throws Error.
+Track LoadTrack(const std::string& path);
+void TellRounding(const std::string& path, std::size_t rounded_coordinates);
+
 // Index of the frame asked for, or else of the first with a face (the first when none has). Throws
 // Error when there is no frame of that number; `path` stands for the track in messages.
 std::size_t ChosenFrame(const Track& track, const std::string& path,

@@ -12,10 +12,13 @@
 
 #include "commands/commands.h"
 #include "commands/frames.h"
+#include "commands/options.h"
+#include "commands/outputs.h"
 #include "engine/core_session.h"
 #include "engine/engine_session.h"
 #include "render/camera_picture.h"
 #include "render/picture.h"
+#include "support/data_files.h"
 #include "support/error.h"
 #include "tracks/track_file.h"
 
@@ -31,7 +34,7 @@ const std::map<std::string, Convert>& Formats() {
 }
 
 struct MaskOptions {
-  std::string model = DefaultModelPath();
+  std::string model;
   std::string photo;
   std::string track;
   std::string texture;
@@ -53,7 +56,11 @@ Picture LoadPhoto(const MaskOptions& options, const TrackHeader& header) {
 }
 
 void RunMaskCommand(const MaskOptions& options) {
-  const Track track = ReadTrackFile(options.track);
+  const OutputFormat format =
+      FormatOf("--out", options.out, {OutputFormat::kPng, OutputFormat::kJpeg});
+  const std::string model = options.model.empty() ? DefaultModelPath() : options.model;
+  CheckIsNoInput(options.out, {options.photo, options.track, options.texture, model});
+  const Track track = LoadTrack(options.track);
   const std::size_t chosen = ChosenFrame(track, options.track, options.frame);
   if (track.frames[chosen].faces.empty()) {
     throw Error(options.track + ": frame " + std::to_string(track.frames[chosen].number) +
@@ -62,7 +69,7 @@ void RunMaskCommand(const MaskOptions& options) {
   const Picture photo = LoadPhoto(options, track.header);
   CameraPicture texture = CameraPicture::Bgra32(ReadPicture(options.texture));
 
-  CoreSession session(options.model, track.header);
+  CoreSession session(model, track.header);
   for (std::size_t f = 0; f <= chosen; ++f) session.Process(track.frames[f]);
   for (std::size_t k = 0; k < options.settle; ++k) session.Process(track.frames[chosen]);
   CameraPicture image = Formats().at(options.format)(photo);
@@ -71,7 +78,7 @@ void RunMaskCommand(const MaskOptions& options) {
     session.Warp(texture.Descriptor(), face, mask.Descriptor());
     session.Blend(mask.Descriptor(), image.Descriptor());
   }
-  WritePng(options.out, image.ToPicture(photo.width, photo.height));
+  WritePicture(options.out, format, image.ToPicture(photo.width, photo.height));
   std::printf("%s: %zu %s\n", options.out.c_str(), session.faces(),
               session.faces() == 1 ? "face" : "faces");
 }
@@ -84,42 +91,31 @@ void AddMaskCommand(CLI::App& app) {
       "Puts a mask picture on the faces of a photo with the library's own image functions, which\n"
       "need no graphics system.");
   const auto options = std::make_shared<MaskOptions>();
-  command->add_option("photo", options->photo, "PNG or JPEG as delivered, of the track's size")
-      ->required()
-      ->type_name("PHOTO");
-  command->add_option("track", options->track, "Landmark track of the photo")
-      ->required()
-      ->type_name("FILE.track.jsonl");
-  command
-      ->add_option("--texture", options->texture,
-                   "Mask picture, PNG or JPEG, in the layout of data/face_template.png")
-      ->required()
-      ->type_name("MASK.png");
-  command->add_option("--out", options->out, "The upright picture with the masks")
-      ->required()
-      ->type_name("FILE.png");
-  command
-      ->add_option("--format", options->format,
-                   "Pixel format in which the picture is blended: bgr24 (3 bytes a pixel) or nv21\n"
-                   "(a luma and a chroma plane)")
-      ->check(CLI::IsMember(Formats()))
-      ->type_name("FORMAT")
+  AddFileArgument(*command, "PHOTO", options->photo,
+                  "PNG or JPEG as delivered, of the track's size");
+  AddTrackArgument(*command, options->track);
+  AddFileOption(*command, "--texture", options->texture,
+                "Mask picture, PNG or JPEG, in the layout of data/face_template.png")
+      ->required();
+  AddFileOption(*command, "--out", options->out,
+                "The upright picture with the masks, FILE.png or FILE.jpg")
+      ->required();
+  AddChoice(*command, "--format", options->format,
+            "Pixel format in which the picture is blended: bgr24 (3 bytes a pixel) or nv21\n"
+            "(a luma and a chroma plane)",
+            Formats(), "bgr24|nv21")
       ->capture_default_str();
-  command
-      ->add_option("--frame", options->frame,
-                   "Number of the photo's frame, by default the first with a face; the frames\n"
-                   "before it are tracked too")
-      ->type_name("N");
+  AddFrameOption(*command, options->frame,
+                 "Number of the photo's frame, by default the first with a face; the frames\n"
+                 "before it are tracked too");
   command
       ->add_option("--settle", options->settle,
                    "For how many more frames the photo's landmarks are held before it is drawn: a\n"
-                   "new face has the mean face's shape, which becomes the person's by and by")
+                   "new face has the mean face's shape, which gradually becomes the person's")
       ->type_name("N")
-      ->check(CLI::Range(0, 1000))
+      ->check(CLI::Range(0, 1000).description(""))
       ->capture_default_str();
-  command->add_option("--model", options->model, "Face-model file")
-      ->type_name("FILE")
-      ->capture_default_str();
+  AddModelOption(*command, options->model);
   command->footer(
       "Examples:\n"
       "  n3ds mask group.jpg group.track.jsonl --texture examples/assets/mask_tiger.png \\\n"

@@ -11,9 +11,11 @@
 #include "commands/commands.h"
 #include "commands/frame_folder.h"
 #include "commands/frames.h"
+#include "commands/options.h"
 #include "engine/engine_session.h"
 #include "engine/mesh_file.h"
 #include "support/atomic_file.h"
+#include "support/data_files.h"
 #include "support/error.h"
 #include "support/progress.h"
 #include "tracks/track_file.h"
@@ -28,7 +30,7 @@ const std::map<std::string, MeshSpace>& SpacesByName() {
 }
 
 struct MeshOptions {
-  std::string model = DefaultModelPath();
+  std::string model;
   std::string track;
   std::string out;
   std::string space = "viewer";
@@ -36,9 +38,10 @@ struct MeshOptions {
 };
 
 void RunMeshCommand(const MeshOptions& options) {
-  const Track track = ReadTrackFile(options.track);
-  EngineSession session(options.model, track.header, TrackMode::kMask);
-  FrameFolder folder(options.out);
+  const std::string model = options.model.empty() ? DefaultModelPath() : options.model;
+  const Track track = LoadTrack(options.track);
+  EngineSession session(model, track.header, TrackMode::kMask);
+  FrameFolder folder(options.out, {options.track, model});
   Progress progress("meshes of " + track.name, track.frames.size());
   std::size_t written = 0;
   for (std::size_t f = 0; f < track.frames.size(); ++f) {
@@ -67,26 +70,16 @@ void AddMeshCommand(CLI::App& app) {
   CLI::App* command = app.add_subcommand(
       "mesh", "Writes the dense meshes of mask mode as OBJ files, one a frame, for other tools.");
   const auto options = std::make_shared<MeshOptions>();
-  command->add_option("track", options->track, "Landmark track")
-      ->required()
-      ->type_name("FILE.track.jsonl");
-  command->add_option("--out", options->out, "Folder that gets the files")
-      ->required()
-      ->type_name("FOLDER");
-  command
-      ->add_option("--space", options->space,
-                   "Where the vertices are: before the viewer with the head's pose, or in the\n"
-                   "upright head with the expression alone")
-      ->check(CLI::IsMember(SpacesByName()))
-      ->type_name("viewer|head")
+  AddTrackArgument(*command, options->track);
+  AddFileOption(*command, "--out", options->out, "Folder that gets the files", "FOLDER")
+      ->required();
+  AddChoice(*command, "--space", options->space,
+            "Where the vertices are: before the viewer with the head's pose, or in the\n"
+            "upright head with the expression alone",
+            SpacesByName(), "viewer|head")
       ->capture_default_str();
-  command->add_option("--every", options->every, "Write every Nth frame")
-      ->type_name("N")
-      ->check(CLI::Range(1, 1000000))
-      ->capture_default_str();
-  command->add_option("--model", options->model, "Face-model file")
-      ->type_name("FILE")
-      ->capture_default_str();
+  AddEveryOption(*command, options->every, "Write every Nth frame");
+  AddModelOption(*command, options->model);
   command->footer(
       "All files have the same vertex order and texture coordinates, an object a face. Lengths\n"
       "are in mm, x to the right, y up, z towards the viewer.\n"

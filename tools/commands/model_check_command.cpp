@@ -9,6 +9,7 @@
 
 #include "commands/model_commands.h"
 #include "commands/model_options.h"
+#include "commands/options.h"
 #include "model/model_checks.h"
 #include "support/error.h"
 
@@ -37,7 +38,7 @@ void AddModelCheckCommand(CLI::App& model) {
   CLI::App* command = model.add_subcommand(
       "check", "Checks the shapes of a face-model file on the engine's mesh, and prints a table.");
   const auto options = std::make_shared<CheckOptions>();
-  command->add_option("file", options->model, "Face-model file")->required()->type_name("FILE");
+  AddFileArgument(*command, "MODEL", options->model, "Face-model file");
   AddIdentityUnit(*command, options->identity_unit);
   command->footer(
       "Triangles, texture coordinates and the names of the expressions are those the engine was\n"

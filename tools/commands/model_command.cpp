@@ -13,6 +13,7 @@
 
 #include "commands/commands.h"
 #include "commands/model_commands.h"
+#include "commands/options.h"
 #include "engine/face_model_file.h"
 #include "support/error.h"
 
@@ -144,7 +145,7 @@ void AddModelCommand(CLI::App& app) {
   CLI::App* info = command->add_subcommand(
       "info", "Prints counts, ranges and sizes of a face-model file and whether it is usable.");
   const auto path = std::make_shared<std::string>();
-  info->add_option("file", *path, "Face-model file")->required()->type_name("FILE");
+  AddFileArgument(*info, "MODEL", *path, "Face-model file");
   info->footer(
       "The box is given as stored (pitched by 20 degrees) and in the upright frame of the "
       "engine's\n"

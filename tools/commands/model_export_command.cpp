@@ -9,6 +9,8 @@
 
 #include "commands/model_commands.h"
 #include "commands/model_options.h"
+#include "commands/options.h"
+#include "commands/outputs.h"
 #include "model/obj_export.h"
 
 namespace n3ds::tool {
@@ -20,6 +22,8 @@ struct ExportOptions {
 };
 
 void RunModelExport(const ExportOptions& options) {
+  FormatOf("--obj", options.obj, {OutputFormat::kObj});
+  CheckIsNoInput(options.obj, {options.face.model});
   WriteFaceObj(options.obj, options.face.face());
   std::printf("%s\n", options.obj.c_str());
 }
@@ -30,9 +34,8 @@ void AddModelExportCommand(CLI::App& model) {
   CLI::App* command = model.add_subcommand("export", "Writes a face of the model as an OBJ file.");
   const auto options = std::make_shared<ExportOptions>();
   AddFaceOptions(*command, options->face);
-  command->add_option("--obj", options->obj, "Wavefront OBJ file to write")
-      ->required()
-      ->type_name("FILE.obj");
+  AddFileOption(*command, "--obj", options->obj, "Wavefront OBJ file to write", "FILE.obj")
+      ->required();
   command->footer(
       "Millimetres in the upright frame of the engine's model matrix, with the texture\n"
       "coordinates of the masks (v upwards, as OBJ has it).\n"

@@ -6,6 +6,7 @@
 #include <cmath>
 #include <cstdlib>
 
+#include "commands/options.h"
 #include "mesh/face_tables.h"
 #include "support/error.h"
 
@@ -31,15 +32,24 @@ Setting ParseSetting(const std::string& option, const std::string& text, double 
     }
   }
   const std::string range = std::to_string(static_cast<int>(limit));
-  throw Error(option + " " + text + ": NAME=VALUE with a value from -" + range + " to " + range +
-              " is needed");
+  throw UsageError(option + " " + text + ": expected NAME=VALUE with a value from -" + range +
+                   " to " + range);
 }
 
 std::size_t ParseMode(const std::string& name, const std::string& text) {
   for (std::size_t mode = 1; mode <= kModelIdentities; ++mode) {
     if (name == std::to_string(mode)) return mode - 1;
   }
-  throw Error("--identity " + text + ": there are modes 1 to " + std::to_string(kModelIdentities));
+  throw UsageError("--identity " + text + ": there are modes 1 to " +
+                   std::to_string(kModelIdentities));
+}
+
+std::size_t ParseExpression(const std::string& name, const std::string& text) {
+  try {
+    return ExpressionByName(name);
+  } catch (const Error& error) {
+    throw UsageError("--expression " + text + ": " + error.what());
+  }
 }
 
 }  // namespace
@@ -52,7 +62,7 @@ FaceCoefficients FaceOptions::coefficients() const {
   }
   for (const std::string& text : expression) {
     const Setting setting = ParseSetting("--expression", text, kLargestExpression);
-    coefficients.expression[ExpressionByName(setting.name)] = setting.value;
+    coefficients.expression[ParseExpression(setting.name, text)] = setting.value;
   }
   return coefficients;
 }
@@ -69,12 +79,12 @@ void AddIdentityUnit(CLI::App& command, double& unit) {
           "Standard deviations of the population at identity coefficient 1, which the file\n"
           "does not say")
       ->type_name("N")
-      ->check(CLI::Range(0.1, 1000.0))
+      ->check(CLI::Range(0.1, 1000.0).description(""))
       ->capture_default_str();
 }
 
 void AddFaceOptions(CLI::App& command, FaceOptions& options) {
-  command.add_option("file", options.model, "Face-model file")->required()->type_name("FILE");
+  AddFileArgument(command, "MODEL", options.model, "Face-model file");
   command
       .add_option("--identity", options.identity,
                   "Identity mode (1 to 16) and its amount in standard deviations; may be repeated")

@@ -9,6 +9,8 @@
 
 #include "commands/model_commands.h"
 #include "commands/model_options.h"
+#include "commands/options.h"
+#include "commands/outputs.h"
 #include "render/turntable.h"
 
 namespace n3ds::tool {
@@ -22,8 +24,11 @@ struct RenderOptions {
 };
 
 void RunModelRender(const RenderOptions& options) {
+  const OutputFormat format =
+      FormatOf("--out", options.out, {OutputFormat::kPng, OutputFormat::kJpeg});
+  CheckIsNoInput(options.out, {options.face.model});
   const Points face = options.face.face();
-  WritePng(options.out, DrawTurntable(face, options.views, options.size));
+  WritePicture(options.out, format, DrawTurntable(face, options.views, options.size));
   std::printf("%s\n", options.out.c_str());
 }
 
@@ -34,16 +39,17 @@ void AddModelRenderCommand(CLI::App& model) {
       "render", "Draws a face of the model, lit, from several sides in one picture.");
   const auto options = std::make_shared<RenderOptions>();
   AddFaceOptions(*command, options->face);
-  command->add_option("--out", options->out, "Picture to write")->required()->type_name("FILE.png");
+  AddFileOption(*command, "--out", options->out, "Picture to write, FILE.png or FILE.jpg")
+      ->required();
   command
       ->add_option("--views", options->views,
                    "Views side by side, from one profile to the other; 1 is the front alone")
       ->type_name("N")
-      ->check(CLI::Range(1, 16))
+      ->check(CLI::Range(1, 16).description(""))
       ->capture_default_str();
   command->add_option("--size", options->size, "Width and height of a view, pixels")
       ->type_name("N")
-      ->check(CLI::Range(16, 2048))
+      ->check(CLI::Range(16, 2048).description(""))
       ->capture_default_str();
   command->footer(
       "Examples:\n"

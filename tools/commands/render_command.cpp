@@ -18,6 +18,7 @@
 #include "commands/frame_folder.h"
 #include "commands/frames.h"
 #include "commands/options.h"
+#include "commands/outputs.h"
 #include "engine/engine_session.h"
 #include "render/contact_sheet.h"
 #include "render/picture.h"
@@ -47,9 +48,8 @@ struct RenderOptions {
   bool closeup = false;
 };
 
-bool EndsWith(const std::string& text, const std::string& ending) {
-  return text.size() >= ending.size() &&
-         text.compare(text.size() - ending.size(), ending.size(), ending) == 0;
+bool IsPicture(OutputFormat format) {
+  return format == OutputFormat::kPng || format == OutputFormat::kJpeg;
 }
 
 // "640x360" as a box, or nothing.
@@ -60,7 +60,7 @@ std::optional<Size> ParseSize(const std::string& text) {
   if (std::sscanf(text.c_str(), "%dx%d%c", &size.width, &size.height, &rest) != 2 ||
       size.width < 16 || size.height < 16 || size.width > kLargestDrawnSide ||
       size.height > kLargestDrawnSide) {
-    throw Error("--size " + text + ": WIDTHxHEIGHT from 16x16 to 8192x8192 is needed");
+    throw UsageError("--size " + text + ": expected WIDTHxHEIGHT from 16x16 to 8192x8192");
   }
   return size;
 }
@@ -70,7 +70,7 @@ SceneParts DefaultParts(const RenderOptions& options) {
   // On a plain ground one would see hats, glasses and masks hang in the air.
   parts.head = options.image.empty();
   if (options.engine.mode() == TrackMode::kMask) {
-    parts.glasses = parts.hat = parts.axes = parts.landmarks = false;
+    parts.glasses = parts.hat = false;
     parts.mesh = options.texture.empty();
   }
   return parts;
@@ -93,7 +93,8 @@ SceneParts ParseParts(const RenderOptions& options) {
 void CheckMode(const RenderOptions& options, const SceneParts& parts) {
   if (options.engine.mode() == TrackMode::kMask) return;
   if (parts.mesh || parts.wireframe || !options.texture.empty()) {
-    throw Error("--texture and the parts mesh and wireframe need the dense mesh of --mode mask");
+    throw UsageError(
+        "--texture and the parts mesh and wireframe need the dense mesh of --mode mask");
   }
 }
 
@@ -112,33 +113,43 @@ std::optional<Picture> LoadBackground(const RenderOptions& options, const TrackH
 }
 
 // Frames to draw, by their index, in ascending order.
-std::vector<std::size_t> ChooseFrames(const Track& track, const RenderOptions& options) {
+std::vector<std::size_t> ChooseFrames(const Track& track, const RenderOptions& options,
+                                      OutputFormat format) {
   if (options.contact_sheet > 0) return EvenlySpaced(track.frames.size(), options.contact_sheet);
-  if (EndsWith(options.out, ".png")) return {ChosenFrame(track, options.track, options.frame)};
+  if (IsPicture(format)) return {ChosenFrame(track, options.track, options.frame)};
   std::vector<std::size_t> chosen;
   for (std::size_t f = 0; f < track.frames.size(); f += options.every) chosen.push_back(f);
   return chosen;
 }
 
+std::vector<std::string> Inputs(const RenderOptions& options, const std::string& model) {
+  return {options.track, model, options.image, options.texture};
+}
+
 // One drawing of a track's frames.
 class Drawing {
  public:
-  Drawing(const Track& track, const RenderOptions& options, const SceneParts& parts)
-      : track_(track), options_(options), chosen_(ChooseFrames(track, options)) {
+  Drawing(const Track& track, const RenderOptions& options, const SceneParts& parts,
+          OutputFormat format, const std::string& model)
+      : track_(track),
+        options_(options),
+        format_(format),
+        model_(model),
+        chosen_(ChooseFrames(track, options, format)) {
     const std::optional<Size> box = ParseSize(options.size);
     const int side = options.contact_sheet > 0 ? kDefaultTile : kDefaultSide;
     view_ =
         options.closeup ? CloseView(track, chosen_, box, side) : WholeView(track.header, box, side);
-    if (EndsWith(options.out, ".mp4")) view_.MakeEven();
+    if (format == OutputFormat::kFilm) view_.MakeEven();
     std::optional<Picture> mask;
     if (!options.texture.empty()) mask = ReadPicture(options.texture);
-    scene_ = std::make_unique<Scene>(track.header, options.engine.model, parts,
-                                     LoadBackground(options, track.header), view_.whole.width,
-                                     view_.whole.height, mask);
+    scene_ =
+        std::make_unique<Scene>(track.header, model_, parts, LoadBackground(options, track.header),
+                                view_.whole.width, view_.whole.height, mask);
   }
 
   void Run() {
-    if (EndsWith(options_.out, ".mp4")) {
+    if (format_ == OutputFormat::kFilm) {
       VideoWriter film(options_.out, view_.shown.width, view_.shown.height,
                        track_.header.fps / static_cast<double>(options_.every));
       DrawFrames([&](const FrameResult&, const Picture& picture) { film.Add(picture); });
@@ -148,12 +159,13 @@ class Drawing {
       DrawFrames([&](const FrameResult& result, const Picture& picture) {
         sheet.Add(picture, result.number);
       });
-      WritePng(options_.out, sheet.picture());
-    } else if (EndsWith(options_.out, ".png")) {
-      DrawFrames(
-          [&](const FrameResult&, const Picture& picture) { WritePng(options_.out, picture); });
+      WritePicture(options_.out, format_, sheet.picture());
+    } else if (IsPicture(format_)) {
+      DrawFrames([&](const FrameResult&, const Picture& picture) {
+        WritePicture(options_.out, format_, picture);
+      });
     } else {
-      FrameFolder folder(options_.out);
+      FrameFolder folder(options_.out, Inputs(options_, model_));
       DrawFrames([&](const FrameResult& result, const Picture& picture) {
         WritePng(folder.File(result.number, ".png"), picture);
       });
@@ -164,7 +176,7 @@ class Drawing {
  private:
   // Runs the whole track, because tracking is a sequence in time, and draws the chosen frames.
   void DrawFrames(const std::function<void(const FrameResult&, const Picture&)>& use) {
-    EngineSession session(options_.engine.model, track_.header, options_.engine.mode());
+    EngineSession session(model_, track_.header, options_.engine.mode());
     Progress progress("drawing " + track_.name, chosen_.size());
     std::size_t next = 0;
     for (std::size_t f = 0; f < track_.frames.size() && next < chosen_.size(); ++f) {
@@ -179,6 +191,8 @@ class Drawing {
 
   const Track& track_;
   const RenderOptions& options_;
+  OutputFormat format_;
+  std::string model_;
   std::vector<std::size_t> chosen_;
   View view_;
   std::unique_ptr<Scene> scene_;
@@ -187,13 +201,20 @@ class Drawing {
 void RunRenderCommand(const RenderOptions& options) {
   const SceneParts parts = ParseParts(options);
   CheckMode(options, parts);
-  const Track track = ReadTrackFile(options.track);
+  const OutputFormat format = FormatOf(
+      "--out", options.out,
+      {OutputFormat::kPng, OutputFormat::kJpeg, OutputFormat::kFilm, OutputFormat::kFolder});
+  ParseSize(options.size);
   const bool sheet = options.contact_sheet > 0;
-  if (!EndsWith(options.out, ".png") && (sheet || options.frame)) {
-    throw Error("--frame and --contact-sheet make one picture: --out must end in .png");
+  if (!IsPicture(format) && (sheet || options.frame)) {
+    throw UsageError(
+        "--frame and --contact-sheet make one picture: --out must end in .png or .jpg");
   }
-  if (sheet && options.frame) throw Error("--frame and --contact-sheet exclude each other");
-  Drawing(track, options, parts).Run();
+  if (sheet && options.frame) throw UsageError("--frame and --contact-sheet exclude each other");
+  const std::string model = options.engine.model_path();
+  CheckIsNoInput(options.out, Inputs(options, model));
+  const Track track = LoadTrack(options.track);
+  Drawing(track, options, parts, format, model).Run();
   std::printf("%s\n", options.out.c_str());
 }
 
@@ -205,48 +226,37 @@ void AddRenderCommand(CLI::App& app) {
       "Draws a hat and glasses on the faces of a track, placed by the engine's matrices alone; in\n"
       "mask mode the face's dense mesh, plain or under a mask picture.");
   const auto options = std::make_shared<RenderOptions>();
-  command->add_option("track", options->track, "Landmark track")
-      ->required()
-      ->type_name("FILE.track.jsonl");
-  command
-      ->add_option("--out", options->out,
-                   "FILE.png for one picture, FILE.mp4 for a film, anything else is a folder that\n"
-                   "gets a picture a frame")
-      ->required()
-      ->type_name("PATH");
-  command
-      ->add_option("--image", options->image,
-                   "PNG or JPEG drawn behind, as delivered (it is turned like the landmarks)")
-      ->type_name("FILE");
-  command->add_option("--frame", options->frame, "Number of the frame in a picture")
-      ->type_name("N");
+  AddTrackArgument(*command, options->track);
+  AddFileOption(*command, "--out", options->out,
+                "FILE.png or FILE.jpg for one picture, FILE.mp4 for a film; a name without an\n"
+                "ending is a folder that gets a PNG a frame",
+                "PATH")
+      ->required();
+  AddFileOption(*command, "--image", options->image,
+                "PNG or JPEG drawn behind, as delivered (it is turned like the landmarks)");
+  AddFrameOption(*command, options->frame, "Number of the frame in a picture");
   command
       ->add_option("--contact-sheet", options->contact_sheet,
                    "Grid of N evenly spaced frames in one picture (12)")
       ->type_name("N")
       ->expected(0, 1)
       ->default_str("12")
-      ->check(CLI::Range(1, 400));
-  command->add_option("--every", options->every, "Draw every Nth frame of a film or folder")
-      ->type_name("N")
-      ->check(CLI::Range(1, 1000000))
-      ->capture_default_str();
+      ->check(CLI::Range(1, 400).description(""));
+  AddEveryOption(*command, options->every, "Draw every Nth frame of a film or folder");
   command->add_option("--size", options->size, "Box into which a picture, film or tile is fitted")
       ->type_name("WIDTHxHEIGHT");
   command->add_flag("--closeup", options->closeup, "Show the heads alone");
-  command
-      ->add_option("--draw", options->draw,
-                   "What to draw: glasses, hat, axes, landmarks, head (all by default; the head\n"
-                   "not on a photo); in mask mode also mesh, wireframe (by default the mesh, and\n"
-                   "the head not on a photo)")
-      ->delimiter(',')
-      ->type_name("LIST")
-      ->check(CLI::IsMember({"glasses", "hat", "axes", "landmarks", "head", "mesh", "wireframe"}));
-  command
-      ->add_option("--texture", options->texture,
-                   "PNG or JPEG drawn on the dense mesh of mask mode, in the layout of\n"
-                   "data/face_template.png")
-      ->type_name("MASK.png");
+  AddChoice(
+      *command, "--draw", options->draw,
+      "What to draw: hat, glasses, head (by default these; the head not on a photo),\n"
+      "axes, landmarks; in mask mode also mesh, wireframe (by default the mesh, and\n"
+      "the head not on a photo)",
+      std::vector<std::string>{"glasses", "hat", "axes", "landmarks", "head", "mesh", "wireframe"},
+      "LIST")
+      ->delimiter(',');
+  AddFileOption(*command, "--texture", options->texture,
+                "PNG or JPEG drawn on the dense mesh of mask mode, in the layout of\n"
+                "data/face_template.png");
   AddEngineOptions(*command, options->engine);
   command->footer(
       "The output shows the upright, unmirrored picture, whatever the orientation of the track.\n"

@@ -30,8 +30,6 @@ std::string LoadFailure(const std::string& path, MRESULT result) {
 
 }  // namespace
 
-std::string DefaultModelPath() { return N3DS_DATA_DIR "/face_model.bin"; }
-
 EngineSession::EngineSession(const std::string& model_path, const TrackHeader& header,
                              TrackMode mode)
     : engine_(Norvale_3DSticker_CreateEngine()), header_(header), mode_(mode) {

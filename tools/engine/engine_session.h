@@ -16,9 +16,6 @@ namespace n3ds::tool {
 // mask mode dense meshes as well.
 enum class TrackMode { kRigid, kMask };
 
-// The model that comes with the source tree.
-std::string DefaultModelPath();
-
 class EngineSession {
  public:
   // Throws Error when the model cannot be loaded.

@@ -32,6 +32,10 @@ PixelPoint TruePlace(const TrackHeader& header, const TrackTruth& truth, std::si
 
 }  // namespace
 
+double PupilDistance(const std::vector<PixelPoint>& landmarks) {
+  return Distance(landmarks[kPupils[0]], landmarks[kPupils[1]]);
+}
+
 void MeshScore::Add(const MeshScore& other) {
   const auto append = [](std::vector<double>& to, const std::vector<double>& from) {
     to.insert(to.end(), from.begin(), from.end());
@@ -104,7 +108,7 @@ void MeshJudge::AddDistances(const TrackHeader& header, const TrackFace& face,
                              const FaceResult& result, const Points& vertices,
                              MeshScore& score) const {
   const std::vector<PixelPoint> seen = UprightLandmarks(header, face);
-  const double pupils = Distance(seen[kPupils[0]], seen[kPupils[1]]);
+  const double pupils = PupilDistance(seen);
   if (pupils == 0) return;
   const auto drawn = [&](std::size_t landmark) {
     const Vector3& v = vertices[LandmarkVertices()[landmark]];

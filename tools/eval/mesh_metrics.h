@@ -17,7 +17,10 @@ namespace n3ds::tool {
 // a detector's guess.
 constexpr double kMeshYaw = 40;  // degrees, without sign
 
-// Lengths are in percent of the distance between the pupils in the same picture.
+// Between the pupils of a face, in pixels: the unit of the distances.
+double PupilDistance(const std::vector<PixelPoint>& landmarks);
+
+// Lengths are in percent of the interpupillary distance in the same picture.
 struct MeshScore {
   std::size_t faces = 0;          // with a finite pose and mesh, at any yaw
   std::size_t not_finite = 0;     // faces with a number that is none

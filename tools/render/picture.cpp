@@ -7,8 +7,10 @@
 #include <algorithm>
 #include <csetjmp>
 #include <cstdio>  // before jpeglib.h, which needs FILE
+#include <cstdlib>
 #include <fstream>
 #include <iterator>
+#include <memory>
 
 #include "support/atomic_file.h"
 #include "support/error.h"
@@ -108,6 +110,35 @@ Picture DecodeJpeg(const std::string& path, const std::vector<unsigned char>& by
   return picture;
 }
 
+// Encodes into memory that libjpeg allocates; false with a message in `error`. As above, nothing
+// with a destructor may live here.
+bool EncodeJpegInto(const Picture& picture, jpeg_compress_struct& info, JpegError& error,
+                    unsigned char*& bytes, unsigned long& size) {
+  constexpr int kQuality = 92;
+  if (setjmp(error.escape) != 0) return false;
+  jpeg_mem_dest(&info, &bytes, &size);
+  info.image_width = static_cast<JDIMENSION>(picture.width);
+  info.image_height = static_cast<JDIMENSION>(picture.height);
+  info.input_components = 4;
+  info.in_color_space = JCS_EXT_RGBX;
+  jpeg_set_defaults(&info);
+  jpeg_set_quality(&info, kQuality, TRUE);
+  jpeg_start_compress(&info, TRUE);
+  while (info.next_scanline < info.image_height) {
+    // libjpeg's rows are not const, but it only reads them.
+    JSAMPROW row = const_cast<JSAMPROW>(picture.Pixel(0, static_cast<int>(info.next_scanline)));
+    jpeg_write_scanlines(&info, &row, 1);
+  }
+  jpeg_finish_compress(&info);
+  return true;
+}
+
+void WriteBytes(const std::string& path, const unsigned char* bytes, std::size_t size) {
+  AtomicFile out(path);
+  out.stream().write(reinterpret_cast<const char*>(bytes), static_cast<std::streamsize>(size));
+  out.Commit();
+}
+
 }  // namespace
 
 Picture ReadPicture(const std::string& path) {
@@ -130,10 +161,23 @@ void WritePng(const std::string& path, const Picture& picture) {
       0) {
     throw Error(path + ": the PNG cannot be made (" + std::string(image.message) + ")");
   }
-  AtomicFile out(path);
-  out.stream().write(reinterpret_cast<const char*>(bytes.data()),
-                     static_cast<std::streamsize>(size));
-  out.Commit();
+  WriteBytes(path, bytes.data(), size);
+}
+
+void WriteJpeg(const std::string& path, const Picture& picture) {
+  JpegError error{};
+  jpeg_compress_struct info{};
+  info.err = jpeg_std_error(&error.manager);
+  error.manager.error_exit = OnJpegError;
+  error.manager.output_message = OnJpegMessage;
+  jpeg_create_compress(&info);
+  unsigned char* bytes = nullptr;  // from malloc, by libjpeg
+  unsigned long size = 0;
+  const bool encoded = EncodeJpegInto(picture, info, error, bytes, size);
+  jpeg_destroy_compress(&info);
+  const std::unique_ptr<unsigned char, decltype(&std::free)> owner(bytes, std::free);
+  if (!encoded) throw Error(path + ": the JPEG cannot be made (" + error.message + ")");
+  WriteBytes(path, bytes, size);
 }
 
 Picture Upright(const Picture& delivered, int degree, bool mirror) {

@@ -31,6 +31,8 @@ struct Picture {
 Picture ReadPicture(const std::string& path);
 // Writes a PNG through a temporary. Throws Error.
 void WritePng(const std::string& path, const Picture& picture);
+// The same for a JPEG. Alpha is dropped.
+void WriteJpeg(const std::string& path, const Picture& picture);
 
 // The picture un-mirrored and turned clockwise like the landmarks of a track: first mirrored left
 // to right if `mirror`, then turned by `degree` (0, 90, 180 or 270).

@@ -7,6 +7,7 @@
 #include "engine/face_model_file.h"
 #include "render/obj_file.h"
 #include "render/shapes.h"
+#include "support/data_files.h"
 
 namespace n3ds::tool {
 namespace {
@@ -142,8 +143,6 @@ void main() {
 
 const Material kPlaster = {{0.80F, 0.74F, 0.69F}, 1, 0.08F};
 
-std::string Asset(const char* name) { return std::string(N3DS_ASSET_DIR "/") + name; }
-
 void SetMatrices(const GlProgram& program, const FaceResult& face, const Matrix4& model) {
   program.Use();
   glUniformMatrix4fv(program.Uniform("projection"), 1, GL_FALSE, face.projection.data());
@@ -192,8 +191,8 @@ Scene::Scene(const TrackHeader& header, const std::string& model_path, const Sce
       face_(FaceMesh(ReadFaceModelFile(model_path))),
       skull_(SkullMesh()),
       open_skull_(OpenSkullMesh()),
-      glasses_(ReadObj(Asset("glasses.obj"))),
-      hat_(ReadObj(Asset("hat.obj"))),
+      glasses_(ReadObj(StickerPath("glasses.obj"))),
+      hat_(ReadObj(StickerPath("hat.obj"))),
       tripod_(TripodMesh()) {
   glGenVertexArrays(1, &dot_array_);
   glGenBuffers(1, &dot_buffer_);

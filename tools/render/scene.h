@@ -25,8 +25,8 @@ namespace n3ds::tool {
 struct SceneParts {
   bool glasses = true;
   bool hat = true;
-  bool axes = true;
-  bool landmarks = true;
+  bool axes = false;
+  bool landmarks = false;
   bool head = false;  // draw the head itself instead of only letting it hide what is behind it
   bool mesh = false;  // draw the face's dense mesh alone; as all below, in mask mode only
   bool wireframe = false;

@@ -22,7 +22,8 @@ void Progress::Step() {
   const auto now = std::chrono::steady_clock::now();
   if (done_ != total_ && now - last_ < std::chrono::milliseconds(100)) return;
   last_ = now;
-  std::fprintf(stderr, "\r\033[K%s: %zu of %zu", what_.c_str(), done_, total_);
+  std::fprintf(stderr, "\r\033[K%s: %zu", what_.c_str(), done_);
+  if (total_ > 0) std::fprintf(stderr, " of %zu", total_);
   std::fflush(stderr);
 }
 

@@ -10,7 +10,8 @@ namespace n3ds::tool {
 
 class Progress {
  public:
-  Progress(std::string what, std::size_t total);
+  // Without a total the steps are counted.
+  explicit Progress(std::string what, std::size_t total = 0);
   ~Progress();  // wipes the line
   Progress(const Progress&) = delete;
   Progress& operator=(const Progress&) = delete;

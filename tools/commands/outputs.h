@@ -1,0 +1,30 @@
+// SPDX-License-Identifier: MIT
+// What commands write: which format, and not over what they read.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "render/picture.h"
+
+namespace n3ds::tool {
+
+enum class OutputFormat { kPng, kJpeg, kFilm, kObj, kFolder };
+
+// The format that the ending of a path asks for. A folder has no ending, a slash behind it or is
+// there already; a device or pipe without an ending takes the first format. Throws UsageError, which lists the
+// `known` formats' endings, for anything else.
+OutputFormat FormatOf(const std::string& option, const std::string& path,
+                      const std::vector<OutputFormat>& known);
+
+// Writes a PNG or a JPEG, whole or not at all. Throws Error.
+void WritePicture(const std::string& path, OutputFormat format, const Picture& picture);
+
+// Whether a path leads to where standard output goes.
+bool IsStandardOutput(const std::string& path);
+
+// Throws UsageError when `output` is the same file as one of the inputs, by whatever name. "-"
+// stands for standard input.
+void CheckIsNoInput(const std::string& output, const std::vector<std::string>& inputs);
+
+}  // namespace n3ds::tool
