@@ -8,20 +8,13 @@
 #include <vector>
 
 #include "core/contour_reference.h"
-#include "core/face_scene.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Camera;
-using testing::ContourResult;
 using ::testing::Each;
-using testing::HeadPlace;
-using testing::Lcg;
-using testing::MeanShapeFloats;
-using testing::ReferenceContour;
-using testing::RigidTransform;
-using testing::TestSeed;
 
 constexpr int32_t kUntouched = -12345;
 
@@ -326,8 +319,7 @@ TEST(ContourCorrespondence, ReadsTheOutlineLandmarksOnly) {
   float r[9], t[3];
   std::copy_n(pose.r, 9, r);
   std::copy_n(pose.t, 3, t);
-  const std::vector<int32_t> landmarks =
-      DetectLandmarks(testing::ModelShape(), HeadPlace{}, 640, 480);
+  const std::vector<int32_t> landmarks = DetectLandmarks(ModelShape(), HeadPlace{}, 640, 480);
   const std::unique_ptr<int32_t[]> outline(new int32_t[38]);
   std::copy_n(landmarks.begin(), 38, outline.get());
   int32_t out[19];
@@ -343,8 +335,7 @@ TEST(ContourCorrespondence, ExhaustedMemoryLeavesTheCorrespondenceAndLosesNothin
   float r[9], t[3];
   std::copy_n(pose.r, 9, r);
   std::copy_n(pose.t, 3, t);
-  const std::vector<int32_t> landmarks =
-      DetectLandmarks(testing::ModelShape(), HeadPlace{}, 640, 480);
+  const std::vector<int32_t> landmarks = DetectLandmarks(ModelShape(), HeadPlace{}, 640, 480);
 
   int refused = 0;
   int64_t result = N3DS_NO_MEMORY;
@@ -372,8 +363,8 @@ TEST(ContourCorrespondence, ExhaustedMemoryLeavesTheCorrespondenceAndLosesNothin
 
 TEST(ContourCorrespondence, MatchesTheStraightforwardVersionOnRandomPoses) {
   const std::vector<float> vertices = MeanShapeFloats();
-  const std::vector<double> shape = testing::ModelShape();
-  Lcg random(TestSeed());
+  const std::vector<double> shape = ModelShape();
+  Random random = TestRandom();
   size_t updated = 0, probes = 0;
   for (int trial = 0; trial < 600; trial++) {
     const int width = random.Int(40, 2000), height = random.Int(40, 2000);
@@ -410,7 +401,7 @@ TEST(ContourCorrespondence, MatchesTheStraightforwardVersionOnRandomPoses) {
 }
 
 TEST(ContourCorrespondence, MatchesTheStraightforwardVersionOnRandomPixels) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 300; trial++) {
     const int32_t size = random.Int(3, 60);
     Plane plane(size / 2 + 1, size / 2 + 1);
@@ -426,4 +417,4 @@ TEST(ContourCorrespondence, MatchesTheStraightforwardVersionOnRandomPixels) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -9,12 +9,13 @@
 #include <set>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/hull_reference.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 
+// In the point's own namespace, where matchers look for them.
 static bool operator==(const HullPoint& a, const HullPoint& b) {
   return a.x == b.x && a.y == b.y && a.index == b.index;
 }
@@ -22,13 +23,11 @@ static void PrintTo(const HullPoint& p, std::ostream* os) {
   *os << '(' << p.x << ',' << p.y << ")#" << p.index;
 }
 
+namespace testing {
 namespace {
 
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
-using testing::Lcg;
-using testing::ReferenceHull;
-using testing::TestSeed;
 
 std::vector<HullPoint> Numbered(const std::vector<std::pair<int32_t, int32_t>>& positions) {
   std::vector<HullPoint> points;
@@ -142,7 +141,7 @@ TEST(ConvexHull, EqualTurnGoesToThePointFartherLeft) {
 
 TEST(ConvexHull, StepWithoutAnAcceptablePointRepeatsTheLastChoiceUntilTheArrayIsFull) {
   // Numbers that are not positions: a walk that can neither go on nor close runs to the limit.
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   int full = 0;
   for (int trial = 0; trial < 3000; trial++) {
     const int n = random.Int(4, 9);
@@ -174,7 +173,7 @@ TEST(ConvexHull, MoreThanFiveHundredThirtyThreePointsEndTheWalk) {
 }
 
 TEST(ConvexHull, MatchesTheStraightforwardWalkOnRandomPoints) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 4000; trial++) {
     const int n = random.Int(4, 60);
     const int32_t size = 1 << random.Int(1, 24);
@@ -191,7 +190,7 @@ TEST(ConvexHull, MatchesTheStraightforwardWalkOnRandomPoints) {
 }
 
 TEST(ConvexHull, CoordinatesAtTheEndsOfTheRangeAreHarmless) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const int32_t values[] = {INT32_MIN, INT32_MIN + 1, -1, 0, 1, INT32_MAX - 1, INT32_MAX};
   for (int trial = 0; trial < 500; trial++) {
     std::vector<std::pair<int32_t, int32_t>> positions;
@@ -256,7 +255,7 @@ bool IsClear(const std::vector<HullPoint>& hull, const std::vector<HullPoint>& p
 }
 
 TEST(ConvexHull, IsTheTrueHullWhereverEveryCornerTurnsClearly) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   int compared = 0;
   for (int trial = 0; trial < 3000; trial++) {
     std::set<std::pair<int32_t, int32_t>> positions;
@@ -275,4 +274,5 @@ TEST(ConvexHull, IsTheTrueHullWhereverEveryCornerTurnsClearly) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace testing
+}  // namespace n3ds::testing

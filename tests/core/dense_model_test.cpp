@@ -11,22 +11,16 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/model_tables.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/fit_scene.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::FaceMeshTask;
-using n3ds::kExpressionCount;
-using n3ds::kIdentityCount;
-using n3ds::kProductCount;
-using n3ds::kShapeSize;
-using n3ds::testing::Bits;
-using n3ds::testing::Core;
-using n3ds::testing::Lcg;
-using n3ds::testing::TestSeed;
 
 // ---- The product table
 
@@ -36,7 +30,7 @@ int16_t ProductOf(float identity, float expression) {
   alpha[3] = identity;
   beta[7] = expression;
   int16_t products[kProductCount];
-  n3ds::BuildProductTable(alpha, beta, products);
+  BuildProductTable(alpha, beta, products);
   for (int i = 0; i < kProductCount; i++) {
     if (i != 3 * kExpressionCount + 7) {
       EXPECT_EQ(products[i], 0) << i;
@@ -73,21 +67,21 @@ TEST(ProductTable, ConvertsHugeAndUndefinedProductsAsEverywhere) {
   float alpha[kIdentityCount] = {std::numeric_limits<float>::quiet_NaN()};
   const float beta[kExpressionCount] = {1.0f};
   int16_t products[kProductCount];
-  n3ds::BuildProductTable(alpha, beta, products);
+  BuildProductTable(alpha, beta, products);
   EXPECT_EQ(products[0], 0);
 }
 
 // (alpha * beta) * 32768 in single precision: the product is rounded before it is scaled and
 // truncated.
 TEST(ProductTable, RoundsTheProductToFloatFirst) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   float alpha[kIdentityCount];
   float beta[kExpressionCount];
   for (int run = 0; run < 100; run++) {
     for (float& a : alpha) a = static_cast<float>(random.In(-2, 2));
     for (float& b : beta) b = static_cast<float>(random.In(-2, 2));
     int16_t products[kProductCount];
-    n3ds::BuildProductTable(alpha, beta, products);
+    BuildProductTable(alpha, beta, products);
     for (int k = 0; k < kIdentityCount; k++) {
       for (int j = 0; j < kExpressionCount; j++) {
         const float product = alpha[k] * beta[j];
@@ -108,7 +102,7 @@ struct RandomModel {
   float beta[kExpressionCount] = {};
   int16_t products[kProductCount] = {};
 
-  explicit RandomModel(Lcg* random)
+  explicit RandomModel(Random* random)
       : mean(kShapeSize),
         identity(static_cast<size_t>(kIdentityCount) * kShapeSize),
         expression(static_cast<size_t>(kExpressionCount) * kShapeSize),
@@ -119,10 +113,10 @@ struct RandomModel {
     for (int16_t& x : tensor) x = static_cast<int16_t>(40 * random->Int(-128, 127));
   }
 
-  void RandomCoefficients(Lcg* random, double range) {
+  void RandomCoefficients(Random* random, double range) {
     for (float& a : alpha) a = static_cast<float>(random->In(-range, range));
     for (float& b : beta) b = static_cast<float>(random->In(-range, range));
-    n3ds::BuildProductTable(alpha, beta, products);
+    BuildProductTable(alpha, beta, products);
   }
 
   FaceMeshTask Task(uint32_t first, int32_t end, float* shape) const {
@@ -134,7 +128,7 @@ struct RandomModel {
 
   std::vector<float> Mesh() const {
     std::vector<float> shape(kShapeSize);
-    FaceMeshTask task = Task(0, n3ds::kVertexCount, shape.data());
+    FaceMeshTask task = Task(0, kVertexCount, shape.data());
     EXPECT_EQ(n3ds::_GetFace3DModel_Thread(&task), nullptr);
     return shape;
   }
@@ -169,7 +163,7 @@ struct RandomModel {
 };
 
 TEST(DenseMesh, MatchesItsDefinitionInEveryBit) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   RandomModel model(&random);
   for (const double range : {0.3, 1.0, 4.0}) {
     model.RandomCoefficients(&random, range);
@@ -180,7 +174,7 @@ TEST(DenseMesh, MatchesItsDefinitionInEveryBit) {
 }
 
 TEST(DenseMesh, InteractionSumWrapsAt32Bits) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   RandomModel model(&random);
   std::fill(model.tensor.begin(), model.tensor.end(), static_cast<int16_t>(-5120));
   std::fill(std::begin(model.products), std::end(model.products), static_cast<int16_t>(-32767));
@@ -191,7 +185,7 @@ TEST(DenseMesh, InteractionSumWrapsAt32Bits) {
 }
 
 TEST(DenseMesh, TasksWriteTheirOwnVerticesOnly) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   RandomModel model(&random);
   model.RandomCoefficients(&random, 1.0);
   const std::vector<float> whole = model.Mesh();
@@ -215,7 +209,7 @@ TEST(DenseMesh, TasksWriteTheirOwnVerticesOnly) {
 }
 
 TEST(DenseMesh, WithoutCoefficientsItIsTheMeanShape) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const RandomModel model(&random);
   const std::vector<float> mesh = model.Mesh();
   for (size_t c = 0; c < mesh.size(); c++) {
@@ -224,11 +218,11 @@ TEST(DenseMesh, WithoutCoefficientsItIsTheMeanShape) {
 }
 
 TEST(DenseMesh, WithoutIdentityThereIsNoInteraction) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   RandomModel model(&random);
   model.RandomCoefficients(&random, 1.0);
   std::fill(std::begin(model.alpha), std::end(model.alpha), 0.0f);
-  n3ds::BuildProductTable(model.alpha, model.beta, model.products);
+  BuildProductTable(model.alpha, model.beta, model.products);
   const std::vector<float> mesh = model.Mesh();
   std::fill(model.tensor.begin(), model.tensor.end(), static_cast<int16_t>(5080));
   EXPECT_EQ(Bits(model.Mesh()), Bits(mesh));
@@ -237,7 +231,7 @@ TEST(DenseMesh, WithoutIdentityThereIsNoInteraction) {
 // Which of the 320 tensor vectors reach the mesh: those of even index sum, and all of the last
 // identity.
 TEST(DenseMesh, TakesTheCheckerboardAndTheWholeLastIdentity) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   RandomModel model(&random);
   for (int k = 0; k < kIdentityCount; k++) {
     for (int j = 0; j < kExpressionCount; j++) {
@@ -271,13 +265,13 @@ struct Records {
 };
 
 // A context as a mask frame of `faces` faces leaves it, with random coefficients.
-std::unique_ptr<Core> CoreAfterFrame(int faces, uint32_t landmark_count, Lcg* random,
+std::unique_ptr<Core> CoreAfterFrame(int faces, uint32_t landmark_count, Random* random,
                                      MHandle memory = nullptr) {
   auto core = Core::Ready(memory);
-  n3ds::TrackingContext& context = core->context();
+  TrackingContext& context = core->context();
   context.landmarkNum = landmark_count;
   context.faceNum = static_cast<uint32_t>(faces);
-  const size_t history = 2 * size_t{n3ds::kSlotCount} * landmark_count;
+  const size_t history = 2 * size_t{kSlotCount} * landmark_count;
   context.landmarkHistory =
       static_cast<int32_t*>(MMemAlloc(context.memory, history * sizeof(int32_t)));
   if (context.landmarkHistory == nullptr) return core;
@@ -300,7 +294,7 @@ std::unique_ptr<Core> CoreAfterFrame(int faces, uint32_t landmark_count, Lcg* ra
 }
 
 TEST(GetFace3DModel, FillsTheModelRecords) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(2, 101, &random);
   Records records(2, 101);
   ASSERT_EQ(N3DS_GetFace3DModel(core->handle(), records.models.data(), records.matrices.data(), 2),
@@ -309,23 +303,23 @@ TEST(GetFace3DModel, FillsTheModelRecords) {
     const N3DS_3D_MODEL& model = records.models[static_cast<size_t>(f)];
     EXPECT_EQ(model.vertices, core->context().shape[f]);
     EXPECT_EQ(model.vertexCount, 1812);
-    EXPECT_EQ(model.triangles, &n3ds::kTriangles[0][0]);
+    EXPECT_EQ(model.triangles, &kTriangles[0][0]);
     EXPECT_EQ(model.triangleCount, 3456);
   }
 }
 
 TEST(GetFace3DModel, BuildsEachFacesMesh) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int faces = 1; faces <= 5; faces++) {
     const auto core = CoreAfterFrame(faces, 101, &random);
     Records records(static_cast<size_t>(faces), 101);
     ASSERT_EQ(
         N3DS_GetFace3DModel(core->handle(), records.models.data(), records.matrices.data(), faces),
         N3DS_OK);
-    n3ds::TrackingContext& context = core->context();
+    TrackingContext& context = core->context();
     for (int f = 0; f < faces; f++) {
       int16_t products[kProductCount];
-      n3ds::BuildProductTable(context.identityCoef[f], context.expressionCoef[f], products);
+      BuildProductTable(context.identityCoef[f], context.expressionCoef[f], products);
       std::vector<float> expected(kShapeSize);
       FaceMeshTask task = {context.meanShape,
                            context.identityBasis,
@@ -335,7 +329,7 @@ TEST(GetFace3DModel, BuildsEachFacesMesh) {
                            context.expressionCoef[f],
                            products,
                            0,
-                           n3ds::kVertexCount,
+                           kVertexCount,
                            expected.data()};
       n3ds::_GetFace3DModel_Thread(&task);
       ASSERT_EQ(Bits(context.shape[f]), Bits(expected)) << f << " of " << faces;
@@ -344,7 +338,7 @@ TEST(GetFace3DModel, BuildsEachFacesMesh) {
 }
 
 TEST(GetFace3DModel, ViewAndModelMatrixGiveTheModelView) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(1, 101, &random);
   Records records(1, 101);
   ASSERT_EQ(N3DS_GetFace3DModel(core->handle(), records.models.data(), records.matrices.data(), 1),
@@ -364,7 +358,7 @@ TEST(GetFace3DModel, ViewAndModelMatrixGiveTheModelView) {
 struct Landmark {
   double x, y, z;
 };
-std::vector<Landmark> ReferenceLandmarks(const n3ds::TrackingContext& context, int face) {
+std::vector<Landmark> ReferenceLandmarks(const TrackingContext& context, int face) {
   const float* q = context.pose[face];
   const double w = q[0], x = q[1], y = q[2], z = q[3];
   const double r[9] = {
@@ -402,9 +396,9 @@ std::vector<Landmark> ReferenceLandmarks(const n3ds::TrackingContext& context, i
   for (int i = 0; i <= 100; i++) {
     Landmark v = {};
     if (i <= 18) {
-      v = vertex(n3ds::kDefaultContourVertexIndices[i]);
+      v = vertex(kDefaultContourVertexIndices[i]);
     } else if (i <= 94) {
-      v = vertex(n3ds::kInnerLandmarkVertexIndices[i - 19]);
+      v = vertex(kInnerLandmarkVertexIndices[i - 19]);
     } else if (i == 95) {
       v = middle(vertex(1054), vertex(1154));
     } else if (i == 96) {
@@ -440,7 +434,7 @@ std::vector<Landmark> ReferenceLandmarks(const n3ds::TrackingContext& context, i
 }
 
 TEST(GetFace3DModel, LandmarksAreBackProjectedToTheDepthOfTheMesh) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (const uint32_t count : {101u, 165u}) {
     const auto core = CoreAfterFrame(3, count, &random);
     Records records(3, count);
@@ -461,7 +455,7 @@ TEST(GetFace3DModel, LandmarksAreBackProjectedToTheDepthOfTheMesh) {
 }
 
 TEST(GetFace3DModel, PupilsAreRepeatedAndOutlineMiddlesLieBetween) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(1, 165, &random);
   Records records(1, 165);
   ASSERT_EQ(N3DS_GetFace3DModel(core->handle(), records.models.data(), records.matrices.data(), 1),
@@ -476,7 +470,7 @@ TEST(GetFace3DModel, PupilsAreRepeatedAndOutlineMiddlesLieBetween) {
 }
 
 TEST(GetFace3DModel, IsTheSameOnEveryRun) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(5, 165, &random);
   Records first(5, 165);
   ASSERT_EQ(N3DS_GetFace3DModel(core->handle(), first.models.data(), first.matrices.data(), 5),
@@ -494,7 +488,7 @@ TEST(GetFace3DModel, IsTheSameOnEveryRun) {
 }
 
 TEST(GetFace3DModel, RejectsNullArguments) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(1, 101, &random);
   Records records(1, 101);
   N3DS_3D_MODEL* models = records.models.data();
@@ -506,7 +500,7 @@ TEST(GetFace3DModel, RejectsNullArguments) {
 }
 
 TEST(GetFace3DModel, RejectsAnotherFaceCountBeforeAnythingIsWritten) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(2, 101, &random);
   const std::vector<float> shape(core->context().shape[0], core->context().shape[0] + kShapeSize);
   Records records(5, 101);
@@ -542,7 +536,7 @@ TEST(GetFace3DModel, OfNoFacesDoesNothing) {
 }
 
 TEST(GetFace3DModel, PoseThatCannotBeInvertedIsANumericalFailure) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const auto core = CoreAfterFrame(3, 101, &random);
   std::fill_n(core->context().pose[1], 4, 0.0f);
   Records records(3, 101);
@@ -566,3 +560,4 @@ TEST(Get3DLandmarkNum, IsTheLatchedCount) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -9,16 +9,13 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/matching_reference.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
 using ::testing::ElementsAre;
-using testing::Lcg;
-using testing::ReferenceAssignment;
-using testing::TestSeed;
 
 constexpr uint32_t kLandmarks = 101;
 
@@ -143,7 +140,7 @@ TEST(AssignFaces, DistancesWrapIn32Bits) {
 }
 
 TEST(AssignFaces, MatchesTheStraightforwardVersionOnRandomFrames) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 5000; trial++) {
     const auto face_count = static_cast<size_t>(random.Int(1, 5));
     const auto previous_count = static_cast<size_t>(random.Int(0, 5));
@@ -320,4 +317,4 @@ TEST(MoveTracks, ExhaustedMemoryChangesNothing) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -7,13 +7,11 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Core;
-using testing::ModelBytes;
 
 constexpr size_t kModelSize = 2141796;
 
@@ -178,4 +176,4 @@ TEST(FaceModel, ExhaustedMemoryLeavesTheModelBefore) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -7,13 +7,10 @@
 #include <limits>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Lcg;
-using testing::TestSeed;
 
 std::vector<int32_t> Landmarks(int32_t value = 0) { return std::vector<int32_t>(190, value); }
 
@@ -115,7 +112,7 @@ TEST(BlendLandmarks, BlendsNinetyFiveLandmarksAndNoMore) {
 }
 
 TEST(BlendLandmarks, ProductsAreRoundedBeforeTheyAreAdded) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   int differs = 0;
   for (int trial = 0; trial < 3000; trial++) {
     std::vector<int32_t> landmarks = Landmarks(), previous = Landmarks();
@@ -160,4 +157,4 @@ TEST(MotionSum, IsTheSumOfTheAxes) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -7,19 +7,15 @@
 #include <cmath>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/bits.h"
+#include "support/face_scene.h"
+#include "support/random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
 using ::testing::Each;
 using ::testing::ElementsAre;
-using testing::HeadPlace;
-using testing::Lcg;
-using testing::MeanShapeFloats;
-using testing::TestSeed;
 
 constexpr float kUntouched = -12345.0f;
 
@@ -33,7 +29,7 @@ struct Face {
   std::vector<float> out;
 
   explicit Face(uint32_t landmark_count) : count(landmark_count) {
-    Lcg random(7);
+    Random random(7);
     for (uint32_t i = 0; i < 2 * count; i++) landmarks.push_back(random.Int(150, 400));
     out.assign(3 * count, kUntouched);
   }
@@ -213,4 +209,4 @@ TEST(Landmarks3D, AQuaternionThatIsNotOfUnitLengthIsInvertedAsItIs) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

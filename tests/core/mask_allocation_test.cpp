@@ -9,24 +9,16 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
-#include "core/failing_memory.h"
 #include "core/model_tables.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+#include "support/failing_memory.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::kIdentityCount;
-using n3ds::TrackingContext;
-using n3ds::testing::Bits;
-using n3ds::testing::Core;
-using n3ds::testing::DetectLandmarks;
-using n3ds::testing::FaceRecords;
-using n3ds::testing::FailingMemory;
-using n3ds::testing::HeadPlace;
-using n3ds::testing::ImageOf;
-using n3ds::testing::ModelShape;
 
 constexpr int kWidth = 1280, kHeight = 720;
 
@@ -120,7 +112,7 @@ class Rewinder {
   }
 
  private:
-  size_t HistorySize() const { return 2 * size_t{n3ds::kSlotCount} * context_.landmarkNum; }
+  size_t HistorySize() const { return 2 * size_t{kSlotCount} * context_.landmarkNum; }
 
   Core& core_;
   TrackingContext context_;
@@ -232,3 +224,4 @@ TEST(MaskAllocation, WarpReportsThatThereIsNoMemoryForItsOutput) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -13,7 +13,6 @@
 
 #include "core/contour_correspondence.h"
 #include "core/dense_model.h"
-#include "core/face_scene.h"
 #include "core/face_task.h"
 #include "core/model_tables.h"
 #include "core/pose_fitting.h"
@@ -21,25 +20,13 @@
 #include "core/shape_fitting.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::kExpressionCount;
-using n3ds::kIdentityCount;
-using n3ds::kShapeSize;
-using n3ds::MaskFaceTask;
-using n3ds::TrackingContext;
-using n3ds::testing::Bits;
-using n3ds::testing::Camera;
-using n3ds::testing::Core;
-using n3ds::testing::DetectLandmarks;
-using n3ds::testing::FaceRecords;
-using n3ds::testing::HeadPlace;
-using n3ds::testing::ImageOf;
-using n3ds::testing::Lcg;
-using n3ds::testing::ModelShape;
-using n3ds::testing::Person;
-using n3ds::testing::TestSeed;
 
 using Points = std::vector<int32_t>;
 
@@ -52,7 +39,7 @@ const TrackingContext& Model() {
   return core->context();
 }
 const std::vector<float>& MeanShape() {
-  static const std::vector<float> mean = n3ds::testing::MeanShapeFloats();
+  static const std::vector<float> mean = MeanShapeFloats();
   return mean;
 }
 
@@ -69,18 +56,18 @@ struct FaceState {
 
   // What the dense mesh leaves behind.
   void UpdateShape() {
-    int16_t products[n3ds::kProductCount];
-    n3ds::BuildProductTable(identity, expression, products);
-    n3ds::FaceMeshTask task = {Model().meanShape,
-                               Model().identityBasis,
-                               Model().expressionBasis,
-                               Model().tensor,
-                               identity,
-                               expression,
-                               products,
-                               0,
-                               n3ds::kVertexCount,
-                               shape.data()};
+    int16_t products[kProductCount];
+    BuildProductTable(identity, expression, products);
+    FaceMeshTask task = {Model().meanShape,
+                         Model().identityBasis,
+                         Model().expressionBasis,
+                         Model().tensor,
+                         identity,
+                         expression,
+                         products,
+                         0,
+                         kVertexCount,
+                         shape.data()};
     n3ds::_GetFace3DModel_Thread(&task);
   }
 };
@@ -145,9 +132,9 @@ class ReferenceFace {
 
   Points Run(const Points& landmarks) {
     Points points = landmarks;
-    n3ds::PoseWeights weights;
-    n3ds::ComputePoseWeights(points.data(), &weights);
-    const n3ds::FitWeights fit = {0, weights.contour, weights.range, 1.0f};
+    PoseWeights weights;
+    ComputePoseWeights(points.data(), &weights);
+    const FitWeights fit = {0, weights.contour, weights.range, 1.0f};
     const bool gate =
         weights.mouth_open == 0 && weights.frontal == 1 && weights.weighting_switch == 1;
     gates += gate ? 1 : 0;
@@ -157,27 +144,26 @@ class ReferenceFace {
       triples[i][1] = static_cast<float>(points[2 * i + 1]);
     }
     int32_t table[95] = {};
-    std::copy_n(n3ds::kInnerLandmarkVertexIndices, 76, table + 19);
+    std::copy_n(kInnerLandmarkVertexIndices, 76, table + 19);
     float R[9], t[3];
     QuatToRotationMatrix(state.pose_ref, R);
     std::copy_n(state.pose_ref + 4, 3, t);
 
     const auto fit_pose = [&](const float* shape, const int32_t* contour) {
-      n3ds::FitRigidPose(nullptr, points.data(), shape, camera.k, R, t, state.pose_ref, contour,
-                         table, fit);
+      FitRigidPose(nullptr, points.data(), shape, camera.k, R, t, state.pose_ref, contour, table,
+                   fit);
     };
     const auto update_contour = [&](const float* shape) {
-      n3ds::UpdateContourCorrespondence(nullptr, points.data(), shape, camera.k, R, t,
-                                        state.contour);
+      UpdateContourCorrespondence(nullptr, points.data(), shape, camera.k, R, t, state.contour);
     };
     const auto expression = [&] {
-      n3ds::SolveForExpressionCoef(nullptr, points.data(), Model().meanShape, Model().identityBasis,
-                                   Model().expressionBasis, Model().tensor, camera.k, R, t,
-                                   state.identity, state.expression, table, kScale);
+      SolveForExpressionCoef(nullptr, points.data(), Model().meanShape, Model().identityBasis,
+                             Model().expressionBasis, Model().tensor, camera.k, R, t,
+                             state.identity, state.expression, table, kScale);
     };
     const auto identity = [&](float* out) {
-      n3ds::SolveForIdentityCoef(nullptr, triples[0], Model().meanShape, Model().identityBasis,
-                                 camera.k, R, t, out, table, kScale);
+      SolveForIdentityCoef(nullptr, triples[0], Model().meanShape, Model().identityBasis, camera.k,
+                           R, t, out, table, kScale);
     };
     const auto depths = [&] {
       for (int i = 19; i < 95; i++) {
@@ -192,7 +178,7 @@ class ReferenceFace {
       std::copy_n(start, 7, state.pose_ref);
       QuatToRotationMatrix(state.pose_ref, R);
       std::copy_n(start + 4, 3, t);
-      fit_pose(MeanShape().data(), n3ds::kDefaultContourVertexIndices);
+      fit_pose(MeanShape().data(), kDefaultContourVertexIndices);
       for (int round = 0; round < 3; round++) {
         update_contour(MeanShape().data());
         fit_pose(MeanShape().data(), state.contour);
@@ -353,7 +339,7 @@ TEST(MaskWorker, NewFaceFindsThePoseOfTheHead) {
     place.z = 550;
     Face face;
     face.Run(DetectLandmarks(ModelShape(), place, kWidth, kHeight));
-    const n3ds::testing::RigidTransform truth = n3ds::testing::TransformOf(place);
+    const RigidTransform truth = TransformOf(place);
     for (int row = 0; row < 3; row++) {
       for (int column = 0; column < 3; column++) {
         EXPECT_NEAR(face.state.mask_pose[4 * row + column], truth.r[3 * row + column], 0.05) << yaw;
@@ -524,7 +510,7 @@ TEST(MaskWorker, ABrowInTheCameraPlaneKeepsItsObservedPosition) {
   face.Run(landmarks);
   // An unturned pose that puts the vertex of landmark 19 at depth 0. The pose fits fail at such a
   // point and leave the pose, and blending it with itself changes nothing.
-  const int32_t vertex = n3ds::kInnerLandmarkVertexIndices[0];
+  const int32_t vertex = kInnerLandmarkVertexIndices[0];
   const float pose[7] = {1, 0, 0, 0, 0, 0, -MeanShape()[static_cast<size_t>(3 * vertex + 2)]};
   std::copy_n(pose, 7, face.state.pose);
   std::copy_n(pose, 7, face.state.pose_ref);
@@ -594,7 +580,7 @@ TEST(MaskWorker, AllLandmarksOnOnePixelEndInFiniteOutputs) {
 }
 
 TEST(MaskWorker, LandmarksAtTheEndsOfTheirRangeEnd) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 20; run++) {
     Face face;
     for (int frame = 0; frame < 3; frame++) {
@@ -721,7 +707,7 @@ void AddErrors(const TrackingContext& context, const float* pose, const float* s
   const double pupils =
       std::hypot(seen[2 * 95] - seen[2 * 96], seen[2 * 95 + 1] - seen[2 * 96 + 1]);
   for (int i = 0; i < 76; i++) {
-    const float* v = shape + 3 * n3ds::kInnerLandmarkVertexIndices[i];
+    const float* v = shape + 3 * kInnerLandmarkVertexIndices[i];
     const double x = R[0] * v[0] + R[1] * v[1] + R[2] * v[2] + t[0];
     const double y = R[3] * v[0] + R[4] * v[1] + R[5] * v[2] + t[1];
     const double z = R[6] * v[0] + R[7] * v[1] + R[8] * v[2] + t[2];
@@ -762,3 +748,4 @@ TEST(MaskDriver, MeshFallsOnTheLandmarks) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -10,7 +10,7 @@
 #include <utility>
 #include <vector>
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
 using ::testing::Each;
@@ -169,4 +169,4 @@ TEST(CornerTexture, HoldsTwentyThousandSevenHundredThirtySixFloats) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -7,14 +7,10 @@
 #include <vector>
 
 #include "core/contour_reference.h"
-#include "core/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Lcg;
-using testing::SquaredGap;
-using testing::TestSeed;
 
 // Four searches side by side, each keeping the last of equally near candidates; then the first of
 // them that is nearest.
@@ -34,7 +30,7 @@ FoundCandidate FindInFourClasses(const std::vector<HullPoint>& candidates, int32
 
 // Candidates around a centre, with `spread` of 0 all in one place; neighbours in number are
 // neighbours in place, as on a face, or not at all.
-std::vector<HullPoint> Candidates(int32_t centre, int32_t spread, bool ordered, Lcg* random) {
+std::vector<HullPoint> Candidates(int32_t centre, int32_t spread, bool ordered, Random* random) {
   std::vector<HullPoint> candidates(kSearchedCandidates);
   for (int32_t n = 0; n < kSearchedCandidates; n++) {
     const int32_t offset = ordered ? n / 7 : 0;
@@ -45,7 +41,7 @@ std::vector<HullPoint> Candidates(int32_t centre, int32_t spread, bool ordered, 
 }
 
 void ExpectSameFinds(const std::vector<HullPoint>& candidates, int32_t centre, int32_t reach,
-                     Lcg* random) {
+                     Random* random) {
   NearestCandidateSearch search(candidates.data());
   for (int i = 0; i < 40; i++) {
     const int32_t x = centre + random->Int(-reach, reach);
@@ -61,7 +57,7 @@ void ExpectSameFinds(const std::vector<HullPoint>& candidates, int32_t centre, i
 }
 
 TEST(NearestCandidate, IsTheOneOfFourSearchesSideBySide) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (const bool ordered : {false, true}) {
     for (const int32_t spread : {0, 1, 3, 10, 100, 2000}) {
       for (const int32_t reach : {2, 60, 3000}) {
@@ -76,7 +72,7 @@ TEST(NearestCandidate, IsTheOneOfFourSearchesSideBySide) {
 
 // Around 16383 squared distances begin to wrap; a group's rectangle says nothing from there on.
 TEST(NearestCandidate, SquaredDistancesMayWrap) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (const int32_t size : {16300, 16383, 16384, 30000, 46341, 1 << 20, 1 << 30}) {
     for (int trial = 0; trial < 20; trial++) {
       ExpectSameFinds(Candidates(0, size, false, &random), 0, size, &random);
@@ -97,4 +93,4 @@ TEST(NearestCandidate, ACandidateAsFarAsTheStartDoesNotReplaceIt) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -9,18 +9,15 @@
 #include <limits>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/bits.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
 using ::testing::Each;
 using ::testing::ElementsAreArray;
-using testing::HeadPlace;
-using testing::Lcg;
-using testing::TestSeed;
 
 constexpr float kIdentity[9] = {1, 0, 0, 0, 1, 0, 0, 0, 1};
 constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
@@ -116,20 +113,20 @@ std::vector<double> Apply(const float* m, double x, double y, double z, double w
 
 TEST(OutputMatrices, ProjectEveryPointToItsPixel) {
   // Model point -> camera pixel by pinhole = model point -> normalised device coordinates -> pixel.
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 200; trial++) {
     const int width = 2 * random.Int(1, 1000), height = 2 * random.Int(1, 1000);
     const Camera camera(width, height);
     HeadPlace place;
     place.yaw = random.In(-1, 1);
     place.pitch = random.In(-1, 1);
-    const testing::RigidTransform pose = TransformOf(place);
+    const RigidTransform pose = TransformOf(place);
     float r[9], t[3];
     for (int i = 0; i < 9; i++) r[i] = static_cast<float>(pose.r[i]);
     for (int i = 0; i < 3; i++) t[i] = static_cast<float>(pose.t[i]);
     N3DS_RIGID_MATRIX result = {};
     WriteModelViewAndProjection(r, t, camera.k, result.modelMatrix, result.projectionMatrix);
-    const testing::Vec3 p = {random.In(-90, 90), random.In(-90, 90), random.In(-90, 90)};
+    const Vec3 p = {random.In(-90, 90), random.In(-90, 90), random.In(-90, 90)};
     double u, v;
     Project(pose, p, width, height, &u, &v);
     const std::vector<double> eye = Apply(result.modelMatrix, p.x, p.y, p.z);
@@ -226,4 +223,4 @@ TEST(Tilt, OfAPointUndoesTheTiltOfTheRotation) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -10,26 +10,22 @@
 #include <string>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/pose_rounds.h"
+#include "support/bits.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
 using ::testing::Each;
 using ::testing::ElementsAreArray;
-using testing::HeadPlace;
-using testing::Lcg;
-using testing::MeanShapeFloats;
-using testing::TestSeed;
 
 constexpr FitWeights kWeights = {0, 1.0f, 1.0f, 1.0f};
 
 // A fit's arguments and results, ready for a frontal face in a 640 x 480 picture.
 struct Fit {
-  std::vector<int32_t> landmarks = DetectLandmarks(testing::ModelShape(), HeadPlace{}, 640, 480);
+  std::vector<int32_t> landmarks = DetectLandmarks(ModelShape(), HeadPlace{}, 640, 480);
   std::vector<float> vertices = MeanShapeFloats();
   Camera camera = Camera(640, 480);
   float rotation[9];
@@ -79,7 +75,7 @@ std::vector<float> Normalised(const std::vector<float>& p) {
 }
 
 TEST(FitRigidPose, FindsAKnownPose) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 50; trial++) {
     HeadPlace place;
     place.yaw = random.In(-0.3, 0.3);
@@ -89,11 +85,11 @@ TEST(FitRigidPose, FindsAKnownPose) {
     place.y = random.In(-60, 60);
     place.z = random.In(350, 900);
     Fit fit;
-    fit.landmarks = DetectLandmarks(testing::ModelShape(), place, 1280, 960);
+    fit.landmarks = DetectLandmarks(ModelShape(), place, 1280, 960);
     fit.camera = Camera(1280, 960);
     // The contour of the default correspondence is where these landmarks were taken.
     ASSERT_EQ(fit.RunWithContour(), N3DS_OK);
-    const testing::RigidTransform truth = TransformOf(place);
+    const RigidTransform truth = TransformOf(place);
     for (size_t i = 0; i < 9; i++) EXPECT_NEAR(fit.rotation[i], truth.r[i], 0.01) << trial;
     for (size_t i = 0; i < 3; i++) EXPECT_NEAR(fit.translation[i], truth.t[i], 0.01 * place.z);
   }
@@ -170,7 +166,7 @@ TEST(FitRigidPose, PassesWeightsAndSwitchToTheSolverUnchanged) {
   std::vector<std::vector<uint32_t>> results;
   for (const FitWeights& weights : choices) {
     Fit fit;
-    Lcg random(TestSeed());
+    Random random = TestRandom();
     for (int32_t& c : fit.landmarks) c += random.Int(-9, 9);
     fit.weights = weights;
     std::copy_n(fit.contour, 19, fit.table);
@@ -294,4 +290,4 @@ TEST(FitRigidPose, ExhaustedMemoryLeavesThePoseAndLosesNothing) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

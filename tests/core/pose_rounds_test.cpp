@@ -6,17 +6,14 @@
 
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/bits.h"
+#include "support/face_scene.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
 using ::testing::Each;
 using ::testing::ElementsAreArray;
-using testing::HeadPlace;
-using testing::MeanShapeFloats;
 
 constexpr FitWeights kWeights = {0, 1.0f, 1.0f, 1.0f};
 
@@ -25,7 +22,7 @@ struct Face {
   Camera camera = Camera(640, 480);
   float pose[7] = {0.5f, 0.5f, -0.5f, 0.5f, 1, 2, 3};
   int32_t contour[19] = {};
-  std::vector<int32_t> landmarks = DetectLandmarks(testing::ModelShape(), HeadPlace{}, 640, 480);
+  std::vector<int32_t> landmarks = DetectLandmarks(ModelShape(), HeadPlace{}, 640, 480);
 
   PoseRounds Rounds(MHandle memory = nullptr) {
     return PoseRounds(memory, vertices.data(), camera.k, pose, contour);
@@ -113,4 +110,4 @@ TEST(PoseRounds, PoseIsTakenAsItIsAlsoWhenItsQuaternionIsNotOfUnitLength) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -10,14 +10,12 @@
 #include <utility>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Lcg;
-using testing::TestSeed;
 
 // Values that no computation yields, to see what was left alone.
 constexpr int64_t kOldFlag = 7;
@@ -387,7 +385,7 @@ void ReferenceWeights(const int32_t* p, PoseWeights* out) {
 }
 
 TEST(PoseWeights, MatchTheStraightforwardVersionOnRandomLandmarks) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   // Few values make coincident points, and with them early returns, common.
   std::vector<std::tuple<int64_t, int64_t, int64_t>> seen;
   for (int trial = 0; trial < 30000; trial++) {
@@ -412,15 +410,15 @@ TEST(PoseWeights, MatchTheStraightforwardVersionOnRandomLandmarks) {
 }
 
 TEST(PoseWeights, MatchTheStraightforwardVersionOnFaces) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   int frontal = 0, switched = 0;
   for (int trial = 0; trial < 500; trial++) {
-    testing::HeadPlace place;
+    HeadPlace place;
     place.yaw = random.In(-0.3, 0.3);
     place.pitch = random.In(-0.2, 0.2);
     place.roll = random.In(-0.2, 0.2);
     const std::vector<int32_t> landmarks =
-        DetectLandmarks(testing::ModelShape(), place, 640, 480, 101, 1, &random);
+        DetectLandmarks(ModelShape(), place, 640, 480, 101, 1, &random);
     PoseWeights expected, actual;
     ReferenceWeights(landmarks.data(), &expected);
     ASSERT_EQ(ComputePoseWeights(landmarks.data(), &actual), N3DS_OK);
@@ -439,7 +437,7 @@ TEST(PoseWeights, MatchTheStraightforwardVersionOnFaces) {
 }
 
 TEST(PoseWeights, CoordinatesAtTheEndsOfTheRangeAreHarmless) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 2000; trial++) {
     std::vector<int32_t> landmarks(190);
     for (int32_t& c : landmarks) c = random.Int(INT32_MIN, INT32_MAX);
@@ -449,4 +447,4 @@ TEST(PoseWeights, CoordinatesAtTheEndsOfTheRangeAreHarmless) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -6,23 +6,15 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
-#include "core/failing_memory.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+#include "support/failing_memory.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::TrackingContext;
-using n3ds::testing::Bits;
-using n3ds::testing::Core;
-using n3ds::testing::DetectLandmarks;
-using n3ds::testing::FaceRecords;
-using n3ds::testing::FailingMemory;
-using n3ds::testing::HeadPlace;
-using n3ds::testing::ImageOf;
-using n3ds::testing::ModelBytes;
-using n3ds::testing::ModelShape;
 
 constexpr int kWidth = 1280, kHeight = 720;
 
@@ -242,3 +234,4 @@ TEST(RigidAllocation, APoolTooSmallForTheDriverIsRefusedWithoutLoss) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

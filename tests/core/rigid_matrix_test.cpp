@@ -7,22 +7,18 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/landmarks_3d.h"
 #include "core/output_matrices.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Core;
 using ::testing::Each;
 using ::testing::ElementsAreArray;
-using testing::FaceRecords;
-using testing::HeadPlace;
-using testing::ImageOf;
-using testing::ModelShape;
 
 constexpr float kUntouched = -12345.0f;
 
@@ -224,4 +220,4 @@ TEST(GetRigidMatrix, CallsAgainGiveTheSame) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -7,16 +7,12 @@
 #include <cmath>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/rigid_reference.h"
+#include "support/bits.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Bits;
-using testing::Lcg;
-using testing::ReferencePoseSmoothing;
-using testing::TestSeed;
 
 constexpr float kPrevious[7] = {0.5f, 0.25f, -0.5f, 0.125f, 10, -20, 600};
 
@@ -154,7 +150,7 @@ TEST(MotionFactor, LooksAtEyeCornersJawAndMouthOnly) {
 }
 
 TEST(SmoothPose, WithTheMotionFactorMatchesTheStraightforwardVersion) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int trial = 0; trial < 5000; trial++) {
     const double size = trial % 2 == 0 ? 0.01 : 0.1;
     const auto moves = static_cast<int32_t>(random.Int(0, 6));
@@ -177,4 +173,4 @@ TEST(SmoothPose, WithTheMotionFactorMatchesTheStraightforwardVersion) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -10,7 +10,6 @@
 #include <vector>
 
 #include "core/contour_correspondence.h"
-#include "core/face_scene.h"
 #include "core/model_tables.h"
 #include "core/output_matrices.h"
 #include "core/pose_fitting.h"
@@ -18,6 +17,7 @@
 #include "core/rigid_shape_refinement.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/face_scene.h"
 
 namespace n3ds::testing {
 

@@ -4,7 +4,10 @@
 #include <algorithm>
 #include <cmath>
 
-#include "core/fit_scene.h"
+#include "support/bits.h"
+#include "support/fit_scene.h"
+#include "support/memory_pool.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -81,7 +84,7 @@ Vector Blend(const Vector& previous, const Vector& solution) {
 }
 
 TEST(RefitIdentityRigidTest, BlendsTheSolutionOfTheOutlineBitForBit) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Refit refit(random.Next());
     refit.scale = static_cast<float>(random.In(0.25, 3.0));
@@ -97,7 +100,7 @@ TEST(RefitIdentityRigidTest, BlendsTheSolutionOfTheOutlineBitForBit) {
 }
 
 TEST(RefitIdentityRigidTest, RepeatedRefitsCloseInOnTheSolution) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const Refit refit(random.Next());
   const Pixels pixels = refit.view.Pixels(RandomCoefficients(&random, 16, 0.5), {});
   const Vector solution =
@@ -108,7 +111,7 @@ TEST(RefitIdentityRigidTest, RepeatedRefitsCloseInOnTheSolution) {
 }
 
 TEST(RefitIdentityRigidTest, InnerLandmarksPlayNoPart) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const Refit refit(random.Next());
   Pixels pixels = refit.view.Pixels({}, {});
   Vector before(16, 1.0f), after(16, 1.0f);
@@ -127,7 +130,7 @@ TEST(RefitIdentityRigidTest, WithoutASolutionTheCoefficientsFade) {
   const Vector previous = {1, -2, 3, 0.1f, 0.7f, 0, 5, 6, 7, 8, 9, 10, 11, 12, 13, 1e-20f};
   const Vector faded = Blend(previous, Vector(16, 0.0f));
 
-  const SmallPool pool(64);
+  const MemoryPool pool(64);
   Vector coef = previous;
   refit.Identity(pool.handle(), pixels, &coef);
   EXPECT_TRUE(SameBits(coef, faded));
@@ -144,7 +147,7 @@ TEST(RefitIdentityRigidTest, WithoutASolutionTheCoefficientsFade) {
 }
 
 TEST(RefitExpressionRigidTest, WritesTheSolutionBitForBit) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Refit refit(random.Next());
     refit.scale = static_cast<float>(random.In(0.25, 3.0));
@@ -159,7 +162,7 @@ TEST(RefitExpressionRigidTest, WritesTheSolutionBitForBit) {
 }
 
 TEST(RefitExpressionRigidTest, RecoversAKnownExpression) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     Refit refit(random.Next());
     refit.scale = 0.01f;  // nearly without the pull toward zero
@@ -225,7 +228,7 @@ void ExpectFallbackOfEveryAllocation(const Vector& previous, const Vector& fallb
   int failures = 0;
   for (size_t length = 256;; length += 64) {
     ASSERT_LT(length, 200000u);
-    const SmallPool pool(length);
+    const MemoryPool pool(length);
     Vector coef = previous;
     refitting(pool.handle(), &coef);
     ASSERT_TRUE(pool.Untouched()) << "scratch not released with a pool of " << length;

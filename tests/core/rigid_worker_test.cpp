@@ -8,25 +8,18 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/face_task.h"
 #include "core/rigid_reference.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
-using testing::Core;
 using ::testing::Each;
 using ::testing::ElementsAreArray;
-using testing::HeadPlace;
-using testing::Lcg;
-using testing::MeanShapeFloats;
-using testing::ModelShape;
-using testing::Person;
-using testing::ReferenceRigidFace;
-using testing::TestSeed;
 
 using Points = std::vector<int32_t>;
 using Worker = void* (*)(void*);
@@ -356,7 +349,7 @@ TEST(RigidWorkers, MatchTheStraightforwardVersionWhereTheIdentityIsRefitted) {
   Totals totals;
   Face face(640, 480);
   ReferenceRigidFace reference;
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   Points previous(202, 0);
   for (int frame = 0; frame < 30; frame++) {
     Points landmarks = frame % 10 == 9 ? OpenMouth() : ShutMouth();
@@ -372,4 +365,4 @@ TEST(RigidWorkers, MatchTheStraightforwardVersionWhereTheIdentityIsRefitted) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

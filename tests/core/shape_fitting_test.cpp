@@ -4,7 +4,10 @@
 #include <algorithm>
 #include <cmath>
 
-#include "core/fit_scene.h"
+#include "support/bits.h"
+#include "support/fit_scene.h"
+#include "support/memory_pool.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -124,7 +127,7 @@ double Distance(const Vector& a, const Vector& b) {
 // --- The definition --------------------------------------------------------------------------
 
 TEST(IdentityFitTest, EqualsTheRowwiseDefinitionBitForBit) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Fit fit(random.Next());
     fit.scale = static_cast<float>(random.In(0.25, 3.0));
@@ -137,7 +140,7 @@ TEST(IdentityFitTest, EqualsTheRowwiseDefinitionBitForBit) {
 }
 
 TEST(ExpressionFitTest, EqualsTheRowwiseDefinitionBitForBit) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Fit fit(random.Next());
     fit.scale = static_cast<float>(random.In(0.25, 3.0));
@@ -153,7 +156,7 @@ TEST(ExpressionFitTest, EqualsTheRowwiseDefinitionBitForBit) {
 // --- Known shapes ----------------------------------------------------------------------------
 
 TEST(IdentityFitTest, RecoversAKnownIdentityWhoseDepthsAreKnown) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     const Fit fit(random.Next());
     const Vector truth = RandomCoefficients(&random, 16, 0.5);
@@ -164,7 +167,7 @@ TEST(IdentityFitTest, RecoversAKnownIdentityWhoseDepthsAreKnown) {
 }
 
 TEST(ExpressionFitTest, RecoversAKnownExpressionOfAKnownPerson) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     Fit fit(random.Next());
     fit.scale = 0.01f;  // nearly without the pull toward zero
@@ -193,7 +196,7 @@ TEST(ExpressionFitTest, MeanShapeHasNoCoefficients) {
 }
 
 TEST(ExpressionFitTest, TensorHasNoEffectOnAPersonWithoutCoefficients) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const Fit fit(random.Next());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, RandomCoefficients(&random, 20, 0.5));
   const Vector nobody(16, 0.0f);
@@ -210,7 +213,7 @@ TEST(ExpressionFitTest, TensorHasNoEffectOnAPersonWithoutCoefficients) {
 }
 
 TEST(ExpressionFitTest, PairsWithAnOddSumOfIndicesPlayNoPart) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const Fit fit(random.Next());
   const Vector person = RandomCoefficients(&random, 16, 0.5);
   const std::vector<int32_t> pixels = fit.view.Pixels(person, RandomCoefficients(&random, 20, 0.5));
@@ -238,7 +241,7 @@ TEST(ExpressionFitTest, PairsWithAnOddSumOfIndicesPlayNoPart) {
 // --- Substituted landmarks -------------------------------------------------------------------
 
 TEST(ShapeFitSubstitutionTest, ObservationsOfSubstitutedLandmarksChangeNothing) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const Fit fit(random.Next());
   const Vector person = RandomCoefficients(&random, 16, 0.5);
   const Vector points = fit.view.Points(person, {});
@@ -275,7 +278,7 @@ TEST(ShapeFitSubstitutionTest, DepthOfASubstitutedLandmarkCountsAllTheSame) {
 
 TEST(ShapeFitSubstitutionTest, StandInMovesTheResultAsOftenAsItStands) {
   // Landmark 40 stands once; put it and a stand-in on the same vertex, and compare their pull.
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   const struct {
     int landmark;
     double times;
@@ -300,7 +303,7 @@ TEST(ShapeFitSubstitutionTest, StandInMovesTheResultAsOftenAsItStands) {
 // --- Priors ----------------------------------------------------------------------------------
 
 TEST(IdentityFitTest, LargerPicturesHoldTheDepthMoreFirmly) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   Fit fit(random.Next());
   const Vector truth = RandomCoefficients(&random, 16, 0.5);
   Vector points = fit.view.Points(truth, {});
@@ -323,7 +326,7 @@ TEST(IdentityFitTest, LargerPicturesHoldTheDepthMoreFirmly) {
 }
 
 TEST(ExpressionFitTest, LargerPicturesPullHarderTowardZero) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   Fit fit(random.Next());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, RandomCoefficients(&random, 20, 0.5));
   double last = 1e9;
@@ -385,7 +388,7 @@ TEST(ShapeFitTest, LandmarksAtOnePixelDoNoHarm) {
 TEST(IdentityFitTest, NullPointersAreRefusedAndNothingIsWritten) {
   const Fit fit(TestSeed());
   const Vector points = fit.view.Points({}, {});
-  const SmallPool pool(64);  // an allocation would give -201
+  const MemoryPool pool(64);  // an allocation would give -201
   for (int null = 0; null < 8; ++null) {
     Vector coef(16, 7.0f);
     const auto unless = [&](int bit, auto* pointer) { return null == bit ? nullptr : pointer; };
@@ -404,7 +407,7 @@ TEST(ExpressionFitTest, NullPointersAreRefusedAndNothingIsWritten) {
   const Fit fit(TestSeed());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, {});
   const Vector person(16, 0.0f);
-  const SmallPool pool(64);
+  const MemoryPool pool(64);
   for (int null = 0; null < 11; ++null) {
     Vector coef(20, 7.0f);
     const auto unless = [&](int bit, auto* pointer) { return null == bit ? nullptr : pointer; };
@@ -430,7 +433,7 @@ void ExpectCleanFailureOfEveryAllocation(size_t system_floats, int count, Solve 
   int no_system = 0, no_scratch = 0;
   for (size_t length = 256;; length += 64) {
     ASSERT_LT(length, 200000u);
-    const SmallPool pool(length);
+    const MemoryPool pool(length);
     Vector coef(count, 7.0f);
     const int32_t status = solve(pool.handle(), &coef);
     ASSERT_TRUE(pool.Untouched()) << "scratch not released with a pool of " << length;
@@ -469,7 +472,7 @@ TEST(ExpressionFitTest, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) 
 }
 
 TEST(ShapeFitTest, CoefficientsAreTheSameBitsOnEveryMachine) {
-  Lcg random(7);
+  Random random(7);
   uint32_t hash = 2166136261u;
   for (int run = 0; run < 20; ++run) {
     const Fit fit(random.Next());

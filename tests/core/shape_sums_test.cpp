@@ -7,19 +7,17 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/bits.h"
+#include "support/test_random.h"
+
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::kSumGroup;
-using n3ds::testing::Bits;
-using n3ds::testing::Lcg;
-using n3ds::testing::TestSeed;
 
 // Vectors in allocations of exactly their size, with all values in use, the extremes often.
 class Vectors {
  public:
-  Vectors(int count, Lcg* random) {
+  Vectors(int count, Random* random) {
     for (int g = 0; g < kSumGroup; g++) {
       data_[g].reset(new int16_t[count]);
       for (int i = 0; i < count; i++) {
@@ -39,7 +37,7 @@ class Vectors {
 };
 
 TEST(ShapeSums, WeightedFormsGiveTheSameBits) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int count = 0; count <= 70; count++) {
     const Vectors vectors(count, &random);
     float weights[kSumGroup];
@@ -48,15 +46,15 @@ TEST(ShapeSums, WeightedFormsGiveTheSameBits) {
     for (int i = 0; i < count; i++) {
       sums[i] = expected[i] = static_cast<float>(random.In(-1e5, 1e5));
     }
-    n3ds::AddWeighted(weights, vectors.get(), count, sums.get());
-    n3ds::AddWeightedPortable(weights, vectors.get(), count, expected.get());
+    AddWeighted(weights, vectors.get(), count, sums.get());
+    AddWeightedPortable(weights, vectors.get(), count, expected.get());
     ASSERT_EQ(Bits(sums, static_cast<size_t>(count)), Bits(expected, static_cast<size_t>(count)))
         << count;
   }
 }
 
 TEST(ShapeSums, ProductFormsGiveTheSameBits) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (int count = 0; count <= 70; count++) {
     const Vectors vectors(count, &random);
     int16_t weights[kSumGroup];
@@ -66,8 +64,8 @@ TEST(ShapeSums, ProductFormsGiveTheSameBits) {
     for (int i = 0; i < count; i++) {
       sums[i] = expected[i] = random.Int(INT32_MIN, INT32_MAX);
     }
-    n3ds::AddProducts(weights, vectors.get(), count, sums.get());
-    n3ds::AddProductsPortable(weights, vectors.get(), count, expected.get());
+    AddProducts(weights, vectors.get(), count, sums.get());
+    AddProductsPortable(weights, vectors.get(), count, expected.get());
     for (int i = 0; i < count; i++) ASSERT_EQ(sums[i], expected[i]) << i << " of " << count;
   }
 }
@@ -79,7 +77,7 @@ TEST(ShapeSums, WeightedTermsAreRoundedOneByOneInOrder) {
   const int16_t* vectors[kSumGroup] = {large.data(), one.data(), minus.data(), one.data()};
   const float weights[kSumGroup] = {1024.0f, 0.4f, 1024.0f, 0.25f};
   std::vector<float> sums(9, 0.5f);
-  n3ds::AddWeighted(weights, vectors, 9, sums.data());
+  AddWeighted(weights, vectors, 9, sums.data());
   // 2^24 + 0.5 rounds to 2^24, and so does 2^24 + 0.4; only the last term is left.
   for (const float sum : sums) EXPECT_EQ(sum, 0.25f);
 }
@@ -89,9 +87,10 @@ TEST(ShapeSums, ProductSumsWrap) {
   const int16_t* vectors[kSumGroup] = {lowest.data(), lowest.data(), lowest.data(), lowest.data()};
   const int16_t weights[kSumGroup] = {-INT16_MAX, -INT16_MAX, -INT16_MAX, -INT16_MAX};
   std::vector<int32_t> sums(9, 0);
-  n3ds::AddProducts(weights, vectors, 9, sums.data());
+  AddProducts(weights, vectors, 9, sums.data());
   // 4 * 32767 * 32768 = 2^32 - 2^17
   for (const int32_t sum : sums) EXPECT_EQ(sum, -(1 << 17));
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -8,30 +8,21 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/matching_reference.h"
 #include "core/rigid_reference.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
-using testing::Bits;
-using testing::Camera;
-using testing::Core;
 using ::testing::Each;
 using ::testing::ElementsAre;
 using ::testing::ElementsAreArray;
-using testing::FaceRecords;
-using testing::HeadPlace;
-using testing::ImageOf;
-using testing::Lcg;
-using testing::ModelShape;
-using testing::Person;
-using testing::ReferenceAssignment;
-using testing::ReferenceRigidFace;
-using testing::TestSeed;
 
 using Points = std::vector<int32_t>;
 using Frame = std::vector<Points>;
@@ -425,7 +416,7 @@ void ExpectSame(const TrackingContext& context, const ReferenceTracker& tracker,
 // People come, go and change their order in the list, `most` at once.
 void CompareWithReference(uint64_t seed, int frames, int most, int landmark_count, int width,
                           int height, ReferenceTracker* tracker, const Core& core) {
-  Lcg random(seed);
+  Random random(seed);
   std::vector<Person> people;
   for (int k = 0; k < most; k++) {
     people.push_back(
@@ -488,7 +479,7 @@ TEST(RigidDriver, ThePictureMayChangeItsSizeBetweenFrames) {
 }
 
 TEST(Drivers, CoordinatesAtTheEndsOfTheRangeAreHarmless) {
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   for (const Driver driver : kDrivers) {
     const auto core = Core::Ready();
     for (int i = 0; i < 10; i++) {
@@ -516,4 +507,4 @@ TEST(Drivers, ThePicturesPixelsAreNotTouched) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -9,6 +9,7 @@
 
 #include "engine/engine_testing.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/core_context.h"
 
 namespace {
 

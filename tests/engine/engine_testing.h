@@ -12,8 +12,9 @@
 #include <utility>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "norvale_3d_sticker_engine.h"
+#include "support/bits.h"
+#include "support/face_scene.h"
 
 namespace n3ds::testing {
 
@@ -123,29 +124,33 @@ inline MRESULT Process(const Engine& engine, const NSVL_OFFSCREEN& image, Points
                                    out->get());
 }
 
-// Which landmark takes each landmark's place in a mirror.
-inline std::vector<size_t> MirrorPartners(size_t count) {
-  std::vector<size_t> partner(count);
-  for (size_t i = 0; i < count; i++) partner[i] = i;
-  const std::vector<std::pair<int, int>> pairs = {
-      {0, 18},    {1, 17},    {2, 16},    {3, 15},    {4, 14},    {5, 13},    {6, 12},
-      {7, 11},    {8, 10},    {19, 34},   {20, 33},   {21, 32},   {22, 31},   {23, 30},
-      {24, 29},   {25, 38},   {26, 37},   {27, 36},   {28, 35},   {39, 57},   {40, 56},
-      {41, 55},   {42, 54},   {43, 53},   {44, 52},   {45, 51},   {46, 62},   {47, 61},
-      {48, 60},   {49, 59},   {50, 58},   {63, 74},   {64, 73},   {65, 72},   {66, 71},
-      {67, 70},   {68, 69},   {75, 81},   {76, 80},   {77, 79},   {82, 86},   {83, 85},
-      {87, 91},   {88, 90},   {92, 94},   {95, 96},   {101, 102}, {103, 120}, {104, 119},
-      {105, 118}, {106, 117}, {107, 116}, {108, 115}, {109, 114}, {110, 113}, {111, 112},
-      {121, 138}, {122, 137}, {123, 136}, {124, 135}, {125, 134}, {126, 133}, {127, 144},
-      {128, 143}, {129, 142}, {130, 141}, {131, 140}, {132, 139}, {145, 150}, {146, 149},
-      {147, 148}, {151, 156}, {152, 155}, {153, 154}, {157, 160}, {158, 159}, {161, 164},
-      {162, 163}};
-  for (const auto& [a, b] : pairs) {
-    if (static_cast<size_t>(std::max(a, b)) >= count) continue;
-    partner[static_cast<size_t>(a)] = static_cast<size_t>(b);
-    partner[static_cast<size_t>(b)] = static_cast<size_t>(a);
+// Which of 165 landmarks takes each landmark's place in a mirror, read off the mean face, whose
+// midline is x = 0: the one nearest to the landmark's mirror image. Landmarks from 101 on are a set
+// of their own, because they repeat the pupils.
+inline std::vector<size_t> PartnersOnTheMeanFace() {
+  const std::vector<Vec3> points = LandmarkPoints(ModelShape(), 165);
+  std::vector<size_t> partners;
+  for (size_t i = 0; i < points.size(); i++) {
+    const auto gap = [&](size_t j) {
+      const double x = points[i].x + points[j].x, y = points[i].y - points[j].y,
+                   z = points[i].z - points[j].z;
+      return x * x + y * y + z * z;
+    };
+    size_t nearest = i < 101 ? 0 : 101;
+    for (size_t j = nearest; j < (i < 101 ? 101 : points.size()); j++) {
+      if (gap(j) < gap(nearest)) nearest = j;
+    }
+    partners.push_back(nearest);
   }
-  return partner;
+  return partners;
+}
+
+// The same among the first `count`; a landmark whose partner is not among them stays.
+inline std::vector<size_t> MirrorPartners(size_t count) {
+  static const std::vector<size_t> all = PartnersOnTheMeanFace();
+  std::vector<size_t> partners;
+  for (size_t i = 0; i < count; i++) partners.push_back(all[i] < count ? all[i] : i);
+  return partners;
 }
 
 // One face's upright landmarks as a camera delivers them whose picture has to be turned clockwise

@@ -10,6 +10,8 @@
 
 #include "engine/engine_testing.h"
 #include "frame_records.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -319,7 +321,7 @@ TEST(RigidFrame, FiveCrossingFacesKeepTheirTracks) {
   // Five people at different distances walk across each other's paths, listed in another order in
   // every frame. No pose may jump to another person's.
   const auto engine = Engine::Ready();
-  Lcg random(TestSeed());
+  Random random = TestRandom();
   std::vector<size_t> order = {0, 1, 2, 3, 4};
   for (int frame = 0; frame < 60; frame++) {
     HeadPlace places[5];

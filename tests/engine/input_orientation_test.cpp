@@ -6,9 +6,10 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "engine/engine_testing.h"
 #include "norvale_face_shape_imp.h"
+#include "support/face_scene.h"
+#include "support/random.h"
 
 namespace n3ds::testing {
 
@@ -51,7 +52,7 @@ class Orientation {
 };
 
 Points RandomPoints(size_t count, uint64_t seed) {
-  Lcg random(seed);
+  Random random(seed);
   Points points;
   for (size_t i = 0; i < count; i++) points.push_back({random.Int(-99, 999), random.Int(-99, 999)});
   return points;
@@ -120,7 +121,7 @@ std::vector<size_t> Renumbering(size_t count) {
   return from;
 }
 
-TEST(InputOrientation, RenumberingIsTheDocumentedOne) {
+TEST(InputOrientation, RenumberingIsThatOfAFaceInAMirror) {
   EXPECT_EQ(Renumbering(101), MirrorPartners(101));
   EXPECT_EQ(Renumbering(165), MirrorPartners(165));
 }
@@ -138,7 +139,7 @@ TEST(InputOrientation, RenumberingIsAnInvolution) {
   }
 }
 
-TEST(InputOrientation, NineLandmarksLieOnTheMiddleLine) {
+TEST(InputOrientation, NineLandmarksLieOnTheMidline) {
   for (const size_t count : {101, 165}) {
     const std::vector<size_t> partner = Renumbering(count);
     std::vector<size_t> fixed;

@@ -9,27 +9,21 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/model_tables.h"
 #include "norvale_3d_sticker_core.h"
 #include "norvale_3d_sticker_engine.h"
+#include "support/bits.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds::testing::Bits;
-using n3ds::testing::DetectLandmarks;
-using n3ds::testing::FaceRecords;
-using n3ds::testing::HeadPlace;
-using n3ds::testing::ImageOf;
-using n3ds::testing::ModelBytes;
-using n3ds::testing::ModelPath;
-using n3ds::testing::ModelShape;
 
 constexpr int kWidth = 1280, kHeight = 720;
 
 // An engine, its output records with landmark buffers of exactly the promised size, and one
 // picture.
-class MaskFrame : public testing::Test {
+class MaskFrame : public ::testing::Test {
  protected:
   MaskFrame() : engine_(Norvale_3DSticker_CreateEngine()), image_(ImageOf(kWidth, kHeight)) {
     MakeBuffers(101);
@@ -170,9 +164,9 @@ TEST_F(MaskFrame, FacesHaveMeshesOfTheirOwnAndOneTextureTable) {
   EXPECT_GE(std::abs(b - a), 31104);
   EXPECT_EQ(models_.models[0].texCoords, models_.models[1].texCoords);
   for (int i = 0; i < 10368; i++) {
-    const uint16_t vertex = n3ds::kTriangles[i / 3][i % 3];
-    ASSERT_EQ(models_.models[0].texCoords[2 * i], n3ds::kTextureCoordinates[vertex][0]) << i;
-    ASSERT_EQ(models_.models[0].texCoords[2 * i + 1], n3ds::kTextureCoordinates[vertex][1]) << i;
+    const uint16_t vertex = kTriangles[i / 3][i % 3];
+    ASSERT_EQ(models_.models[0].texCoords[2 * i], kTextureCoordinates[vertex][0]) << i;
+    ASSERT_EQ(models_.models[0].texCoords[2 * i + 1], kTextureCoordinates[vertex][1]) << i;
   }
 }
 
@@ -182,7 +176,7 @@ TEST_F(MaskFrame, ReportsWhatTheCoreReports) {
   for (const uint32_t count : {101u, 165u}) {
     Initialize();
     MakeBuffers(count);
-    const auto core = n3ds::testing::Core::Ready();
+    const auto core = Core::Ready();
     for (int frame = 0; frame < 4; frame++) {
       const auto points = Points(2, static_cast<int>(count), 3 * frame);
       ASSERT_EQ(Process(points, 2, count), N3DS_OK);
@@ -295,9 +289,9 @@ TEST_F(MaskFrame, MatricesPutTheMeshOnTheFace) {
     }
   };
   // The corners of the mesh that are landmark vertices, found through the triangle list.
-  for (int i = 0; i < n3ds::kInnerLandmarkCount; i++) {
-    const uint16_t* corners = &n3ds::kTriangles[0][0];
-    const auto corner = std::find(corners, corners + 10368, n3ds::kInnerLandmarkVertexIndices[i]);
+  for (int i = 0; i < kInnerLandmarkCount; i++) {
+    const uint16_t* corners = &kTriangles[0][0];
+    const auto corner = std::find(corners, corners + 10368, kInnerLandmarkVertexIndices[i]);
     ASSERT_NE(corner, corners + 10368);
     const float* v = models_.models[0].vertices + 3 * (corner - corners);
     const double world[4] = {v[0], v[1], v[2], 1};
@@ -313,3 +307,4 @@ TEST_F(MaskFrame, MatricesPutTheMeshOnTheFace) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -5,14 +5,13 @@
 #include <cstring>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/core_context.h"
+#include "support/face_scene.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::Core;
 
 TEST(CoreLife, ANewContextIsAllZeroButForItsMemory) {
   std::vector<unsigned char> area(2 * sizeof(TrackingContext), 0xEE);
@@ -40,8 +39,8 @@ TEST(CoreLife, ReleaseGivesTheWholePoolBack) {
   const size_t whole = GetMaxAllocMemSize(pool);
   {
     const auto core = Core::Ready(pool);
-    testing::FaceRecords faces({testing::DetectLandmarks(testing::ModelShape(), {}, 640, 480)});
-    const NSVL_OFFSCREEN image = testing::ImageOf(640, 480);
+    FaceRecords faces({DetectLandmarks(ModelShape(), {}, 640, 480)});
+    const NSVL_OFFSCREEN image = ImageOf(640, 480);
     ASSERT_EQ(N3DS_Build3DFaceForVideo_Rigid(core->handle(), &image, faces.get(), 1), N3DS_OK);
     EXPECT_LT(GetMaxAllocMemSize(pool), whole);
   }
@@ -57,4 +56,4 @@ TEST(CoreLifeDeathTest, AnExhaustedMemoryIsAFatalAssertion) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

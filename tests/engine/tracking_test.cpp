@@ -15,6 +15,7 @@
 #include "norvale_3d_sticker_engine.h"
 #include "tracks/track_file.h"
 #include "tracks/upright.h"
+namespace n3ds::testing {
 
 namespace {
 
@@ -60,7 +61,7 @@ double DegreesBetween(const std::array<double, 9>& truth, const float* estimate)
   return std::acos(std::min(1.0, std::max(-1.0, cosine))) * 180.0 / 3.14159265358979;
 }
 
-class Tracking : public testing::TestWithParam<Bounds> {};
+class Tracking : public ::testing::TestWithParam<Bounds> {};
 
 TEST_P(Tracking, FollowsTheTruth) {
   const Track track = n3ds::tool::ReadTrackFile(std::string(N3DS_SOURCE_DIR) + "/examples/tracks/" +
@@ -134,7 +135,8 @@ constexpr Bounds kBounds[] = {
     {"synthetic_five_cross", 4.0, 12.0, 7.0}, {"synthetic_mirror_portrait", 4.0, 8.0, 4.0},
 };
 
-INSTANTIATE_TEST_SUITE_P(, Tracking, testing::ValuesIn(kBounds),
+INSTANTIATE_TEST_SUITE_P(, Tracking, ::testing::ValuesIn(kBounds),
                          [](const auto& bounds) { return std::string(bounds.param.track); });
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -6,6 +6,7 @@
 #include <cstdint>
 
 #include "norvale_3d_sticker_core.h"
+namespace n3ds::testing {
 
 namespace {
 
@@ -116,3 +117,4 @@ TEST(ColourConversion, StaysWithinOneLevelOfTheRealValuedConversion) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

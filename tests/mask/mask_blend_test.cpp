@@ -3,15 +3,14 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <random>
 #include <vector>
 
 #include "mask/test_picture.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds_test::TestPicture;
 
 int BlendReference(int alpha, int image, double shading, int mask) {
   return ((256 - alpha) * image + alpha * static_cast<int>(shading * mask)) / 256;
@@ -79,7 +78,7 @@ void BlendReference(TestPicture& image, TestPicture& mask, TestPicture& output) 
 }
 
 // A mask with transparent areas, opaque ones and every alpha between them.
-TestPicture RandomMask(int width, int height, int padding, std::mt19937& random) {
+TestPicture RandomMask(int width, int height, int padding, Random& random) {
   TestPicture mask(N3DS_FORMAT_BGRA32, width, height, padding);
   mask.Randomise(random);
   for (int y = 0; y < height; ++y) {
@@ -92,14 +91,14 @@ TestPicture RandomMask(int width, int height, int padding, std::mt19937& random)
   return mask;
 }
 
-class BlendFormats : public testing::TestWithParam<uint32_t> {};
-INSTANTIATE_TEST_SUITE_P(, BlendFormats, testing::Values(N3DS_FORMAT_BGR24, N3DS_FORMAT_NV21),
+class BlendFormats : public ::testing::TestWithParam<uint32_t> {};
+INSTANTIATE_TEST_SUITE_P(, BlendFormats, ::testing::Values(N3DS_FORMAT_BGR24, N3DS_FORMAT_NV21),
                          [](const auto& format) {
                            return format.param == N3DS_FORMAT_BGR24 ? "Bgr24" : "Nv21";
                          });
 
 TEST_P(BlendFormats, MatchesTheReferenceOnAllSizes) {
-  std::mt19937 random(11);
+  Random random = TestRandom();
   for (int height = 1; height <= 9; ++height) {
     for (int width = 1; width <= 40; ++width) {
       for (const int padding : {0, 5}) {
@@ -121,7 +120,7 @@ TEST_P(BlendFormats, MatchesTheReferenceOnAllSizes) {
 }
 
 TEST_P(BlendFormats, InPlaceGivesTheSamePicture) {
-  std::mt19937 random(12);
+  Random random = TestRandom();
   for (const auto& [width, height] : {std::pair(1, 1), {2, 2}, {3, 3}, {17, 9}, {64, 32}}) {
     TestPicture image(GetParam(), width, height, 1);
     image.Randomise(random);
@@ -147,7 +146,7 @@ TEST_P(BlendFormats, RejectsNullArgumentsFirst) {
 }
 
 TEST_P(BlendFormats, RejectsAMaskWithoutAlphaAndDifferentFormatsBeforeWriting) {
-  std::mt19937 random(13);
+  Random random = TestRandom();
   TestPicture image(GetParam(), 4, 4), output(GetParam(), 4, 4);
   TestPicture mask(N3DS_FORMAT_BGRA32, 4, 4), plain_mask(N3DS_FORMAT_BGR24, 4, 4);
   mask.Fill(255);
@@ -233,7 +232,7 @@ TEST(MaskBlend, RedWeighsMostInTheShading) {
 }
 
 TEST(MaskBlend, TransparentMaskCopiesAPackedPicture) {
-  std::mt19937 random(14);
+  Random random = TestRandom();
   TestPicture image(N3DS_FORMAT_BGR24, 31, 7), output(N3DS_FORMAT_BGR24, 31, 7);
   TestPicture mask(N3DS_FORMAT_BGRA32, 31, 7);
   image.Randomise(random);
@@ -246,7 +245,7 @@ TEST(MaskBlend, TransparentMaskCopiesAPackedPicture) {
 }
 
 TEST(MaskBlend, TransparentMaskLeavesATwoPlaneOutputAlone) {
-  std::mt19937 random(15);
+  Random random = TestRandom();
   TestPicture image(N3DS_FORMAT_NV21, 30, 8), output(N3DS_FORMAT_NV21, 30, 8);
   TestPicture mask(N3DS_FORMAT_BGRA32, 30, 8);
   image.Randomise(random);
@@ -258,7 +257,7 @@ TEST(MaskBlend, TransparentMaskLeavesATwoPlaneOutputAlone) {
 
 // One opaque pixel makes the whole block take the round trip, and only that block.
 TEST(MaskBlend, OneOpaquePixelRewritesItsBlockOnly) {
-  std::mt19937 random(16);
+  Random random = TestRandom();
   TestPicture image(N3DS_FORMAT_NV21, 6, 6), mask(N3DS_FORMAT_BGRA32, 6, 6);
   image.Randomise(random);
   for (int i = 0; i < 4; ++i) {
@@ -356,3 +355,4 @@ TEST(MaskBlend, EveryAlphaWithEveryPairOfLevels) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

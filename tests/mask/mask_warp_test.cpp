@@ -6,7 +6,6 @@
 #include <fstream>
 #include <limits>
 #include <memory>
-#include <random>
 #include <string>
 #include <vector>
 
@@ -15,16 +14,13 @@
 #include "mask/test_picture.h"
 #include "mask/warp_scene.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
 
-using n3ds::TrackingContext;
-using n3ds_test::GradientTexture;
-using n3ds_test::TestPicture;
-using n3ds_test::WarpScene;
-
 // A context after a mask frame with two faces, both with the scene's camera and pose.
-class MaskWarp : public testing::Test {
+class MaskWarp : public ::testing::Test {
  protected:
   MaskWarp() : context_(std::make_unique<TrackingContext>()), texture_(GradientTexture(32, 32)) {
     std::memset(static_cast<void*>(context_.get()), 0, sizeof(TrackingContext));
@@ -84,7 +80,7 @@ TEST_F(MaskWarp, MakesAnOutputOfTheGivenSize) {
 }
 
 TEST_F(MaskWarp, DrawsIntoTheCallersOutputByItsOwnSize) {
-  std::mt19937 random(31);
+  Random random = TestRandom();
   TestPicture output(N3DS_FORMAT_BGRA32, 9, 7, 6);
   output.Randomise(random);
   output.get()->pixelFormat = 4711;
@@ -263,7 +259,7 @@ TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
   ASSERT_TRUE(file);
   std::vector<float> vertices;
   for (const int16_t value : mean) vertices.push_back(static_cast<float>(value) / 256.0f);
-  const N3DS_3D_MODEL model = {vertices.data(), N3DS_VERTEX_COUNT, &n3ds::kTriangles[0][0],
+  const N3DS_3D_MODEL model = {vertices.data(), N3DS_VERTEX_COUNT, &kTriangles[0][0],
                                N3DS_TRIANGLE_COUNT};
 
   // The camera looks along -z of the model and has its y downwards.
@@ -304,3 +300,4 @@ TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

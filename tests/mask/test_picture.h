@@ -7,12 +7,12 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
-#include <random>
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
+#include "support/random.h"
 
-namespace n3ds_test {
+namespace n3ds::testing {
 
 class TestPicture {
  public:
@@ -55,13 +55,11 @@ class TestPicture {
       if (planes_[p] != nullptr) std::fill_n(planes_[p].get(), sizes_[p], value);
     }
   }
-  template <typename Generator>
-  void Randomise(Generator& random) {
-    std::uniform_int_distribution<int> byte(0, 255);
+  void Randomise(Random& random) {
     for (int p = 0; p < 2; ++p) {
       if (planes_[p] == nullptr) continue;
       std::generate_n(planes_[p].get(), sizes_[p],
-                      [&] { return static_cast<uint8_t>(byte(random)); });
+                      [&] { return static_cast<uint8_t>(random.Next() >> 23); });
     }
   }
 
@@ -89,4 +87,4 @@ class TestPicture {
   size_t sizes_[2] = {};
 };
 
-}  // namespace n3ds_test
+}  // namespace n3ds::testing

@@ -6,7 +6,6 @@
 #include <cmath>
 #include <cstdint>
 #include <limits>
-#include <random>
 #include <set>
 #include <utility>
 #include <vector>
@@ -14,12 +13,10 @@
 #include "core/model_tables.h"
 #include "mask/test_picture.h"
 #include "mask/warp_scene.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
-
-using n3ds_test::GradientTexture;
-using n3ds_test::TestPicture;
-using n3ds_test::WarpScene;
 
 constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
 constexpr float kInfinity = std::numeric_limits<float>::infinity();
@@ -27,8 +24,7 @@ constexpr float kInfinity = std::numeric_limits<float>::infinity();
 MRESULT Draw(WarpScene& scene, TestPicture& texture, TestPicture& output) {
   const N3DS_3D_MODEL model = scene.Model();
   const N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
-  return n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t,
-                        output.descriptor());
+  return WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor());
 }
 
 TestPicture Canvas(int width, int height, int padding = 0) {
@@ -105,7 +101,7 @@ TEST(WarpFace, TriangleWithinOneRowIsDrawnAsSpans) {
 
 TEST(WarpFace, TrianglesWithoutAreaDrawNothing) {
   TestPicture texture = GradientTexture(32, 32);
-  const std::array<n3ds_test::WarpCorner, 3> flat[] = {
+  const std::array<WarpCorner, 3> flat[] = {
       {{{3, 3, 0, 0}, {3, 3, 1, 0}, {3, 3, 0, 1}}},
       {{{1, 1, 0, 0}, {3, 3, 1, 0}, {6, 6, 0, 1}}},
       {{{2, 5, 0, 0}, {7, 5, 1, 0}, {4, 5, 0, 1}}},
@@ -267,11 +263,10 @@ TEST(WarpFace, TexturesOfThreePixelsShowTheirFirst) {
 // ---- Against the reference
 
 // Coordinates on whole, half and arbitrary positions, inside and around the picture.
-float RandomCoordinate(int size, std::mt19937& random) {
-  std::uniform_real_distribution<float> anywhere(-0.3f * static_cast<float>(size),
-                                                 1.3f * static_cast<float>(size));
-  const float value = anywhere(random);
-  switch (random() % 4) {
+float RandomCoordinate(int size, Random& random) {
+  const float value =
+      random.Float(-0.3f * static_cast<float>(size), 1.3f * static_cast<float>(size));
+  switch (random.Below(4)) {
     case 0:
       return std::floor(value);
     case 1:
@@ -282,27 +277,23 @@ float RandomCoordinate(int size, std::mt19937& random) {
 }
 
 TEST(WarpFace, RandomTrianglesMatchTheReference) {
-  std::mt19937 random(21);
-  std::uniform_real_distribution<float> uv(-0.2f, 1.2f);
+  Random random = TestRandom();
+  const auto uv = [&random] { return random.Float(-0.2f, 1.2f); };
   for (int run = 0; run < 300; ++run) {
-    const int width = 1 + static_cast<int>(random() % 40),
-              height = 1 + static_cast<int>(random() % 30);
-    TestPicture texture =
-        Canvas(1 + static_cast<int>(random() % 20), 1 + static_cast<int>(random() % 20),
-               static_cast<int>(random() % 3));
+    const int width = 1 + random.Int(0, 39), height = 1 + random.Int(0, 29);
+    TestPicture texture = Canvas(1 + random.Int(0, 19), 1 + random.Int(0, 19), random.Int(0, 2));
     texture.Randomise(random);
     WarpScene scene;
     for (int i = 0; i < 12; ++i) {
-      std::array<n3ds_test::WarpCorner, 3> corners;
+      std::array<WarpCorner, 3> corners;
       for (auto& corner : corners) {
-        corner = {RandomCoordinate(width, random), RandomCoordinate(height, random), uv(random),
-                  uv(random)};
+        corner = {RandomCoordinate(width, random), RandomCoordinate(height, random), uv(), uv()};
       }
-      if (i % 4 == 1) corners[1].y = corners[0].y;                       // flat top or bottom
-      if (i % 4 == 2) corners[2].x = corners[0].x + 0.01f * uv(random);  // thin
+      if (i % 4 == 1) corners[1].y = corners[0].y;                 // flat top or bottom
+      if (i % 4 == 2) corners[2].x = corners[0].x + 0.01f * uv();  // thin
       scene.Add(corners);
     }
-    TestPicture output = Canvas(width, height, static_cast<int>(random() % 4));
+    TestPicture output = Canvas(width, height, random.Int(0, 3));
     output.Randomise(random);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "random triangles")) << run;
   }
@@ -310,13 +301,14 @@ TEST(WarpFace, RandomTrianglesMatchTheReference) {
 
 // Triangles of about a pixel: corners share pixels and rows, and their order decides the spans.
 TEST(WarpFace, TinyTrianglesMatchTheReference) {
-  std::mt19937 random(25);
-  std::uniform_real_distribution<float> place(0.0f, 1.6f), uv(0.0f, 1.0f);
+  Random random = TestRandom();
+  const auto place = [&random] { return random.Float(0.0f, 1.6f); };
+  const auto uv = [&random] { return random.Float(0.0f, 1.0f); };
   TestPicture texture = GradientTexture(20, 20);
   for (int run = 0; run < 2000; ++run) {
     WarpScene scene;
-    std::array<n3ds_test::WarpCorner, 3> corners;
-    for (auto& corner : corners) corner = {place(random), place(random), uv(random), uv(random)};
+    std::array<WarpCorner, 3> corners;
+    for (auto& corner : corners) corner = {place(), place(), uv(), uv()};
     scene.Add(corners);
     TestPicture output = Canvas(3, 3);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "tiny")) << run;
@@ -324,18 +316,18 @@ TEST(WarpFace, TinyTrianglesMatchTheReference) {
 }
 
 TEST(WarpFace, SliversAcrossPixelEdgesMatchTheReference) {
-  std::mt19937 random(22);
-  std::uniform_real_distribution<float> place(0.0f, 19.0f);
+  Random random = TestRandom();
+  const auto place = [&random] { return random.Float(0.0f, 19.0f); };
   TestPicture texture = GradientTexture(20, 20);
   for (int run = 0; run < 300; ++run) {
     WarpScene scene;
     for (int i = 0; i < 10; ++i) {
       // Two corners on neighbouring floats around the middle between two rows: the slope of their
       // edge is as steep as it can get.
-      const float y = std::floor(place(random)) + 0.5f;
-      scene.Add({{{place(random), std::nextafter(y, 0.0f), 0.1f, 0.9f},
-                  {place(random), y, 0.8f, 0.9f},
-                  {place(random), place(random), 0.3f, 0.2f}}});
+      const float y = std::floor(place()) + 0.5f;
+      scene.Add({{{place(), std::nextafter(y, 0.0f), 0.1f, 0.9f},
+                  {place(), y, 0.8f, 0.9f},
+                  {place(), place(), 0.3f, 0.2f}}});
     }
     TestPicture output = Canvas(20, 20);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "slivers")) << run;
@@ -343,23 +335,24 @@ TEST(WarpFace, SliversAcrossPixelEdgesMatchTheReference) {
 }
 
 TEST(WarpFace, PosedMeshWithAFullCameraMatchesTheReference) {
-  std::mt19937 random(23);
-  std::uniform_real_distribution<float> place(-60.0f, 60.0f), uv(0.0f, 1.0f);
+  Random random = TestRandom();
+  const auto place = [&random] { return random.Float(-60.0f, 60.0f); };
+  const auto uv = [&random] { return random.Float(0.0f, 1.0f); };
   TestPicture texture = GradientTexture(50, 40);
   for (int run = 0; run < 40; ++run) {
     WarpScene scene;
     for (int i = 0; i < 30; ++i) {
-      const float x = place(random), y = place(random);
-      const int first = scene.Add({{{x, y, uv(random), uv(random)},
-                                    {x + 0.3f * place(random), y, uv(random), uv(random)},
-                                    {x, y + 0.3f * place(random), uv(random), uv(random)}}});
-      for (int c = 0; c < 3; ++c) scene.vertex(first + c)[2] = place(random);
+      const float x = place(), y = place();
+      const int first = scene.Add({{{x, y, uv(), uv()},
+                                    {x + 0.3f * place(), y, uv(), uv()},
+                                    {x, y + 0.3f * place(), uv(), uv()}}});
+      for (int c = 0; c < 3; ++c) scene.vertex(first + c)[2] = place();
     }
-    const float angle = place(random) / 40, c = std::cos(angle), s = std::sin(angle);
+    const float angle = place() / 40, c = std::cos(angle), s = std::sin(angle);
     // The third camera row is not read, and a skewed camera is.
     scene.camera = {{110, 7, 52, -3, 95, 41, kNan, kNan, kNan},
                     {c, 0, s, 0.1f, 1, 0, -s, 0, c},
-                    {2, -3, 70 + 2 * place(random)}};
+                    {2, -3, 70 + 2 * place()}};
     TestPicture output = Canvas(101, 77);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "posed mesh")) << run;
   }
@@ -381,30 +374,30 @@ TEST(WarpFace, RefusesALayoutOfOtherCounts) {
     N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
     mask.texCoordCount = coordinates;
     mask.triangleCount = triangles;
-    EXPECT_EQ(n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t,
-                             output.descriptor()),
-              N3DS_BAD_VALUE);
+    EXPECT_EQ(
+        WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
+        N3DS_BAD_VALUE);
     EXPECT_TRUE(Covered(output).empty());
   }
 }
 
 TEST(WarpFace, MissingArrayBringsTheDefaultLayoutWhateverTheCounts) {
   std::vector<float> upward;
-  for (const auto& [u, v] : n3ds::kTextureCoordinates) {
+  for (const auto& [u, v] : kTextureCoordinates) {
     upward.push_back(u);
     upward.push_back(1.0f - v);
   }
   // The mesh lies in the image as it lies in the texture, so the output is the texture's triangles.
   std::vector<float> vertices;
-  for (const auto& [u, v] : n3ds::kTextureCoordinates) {
+  for (const auto& [u, v] : kTextureCoordinates) {
     vertices.insert(vertices.end(), {80 * u, 90 * v, 1.0f});
   }
-  const N3DS_3D_MODEL model = {vertices.data(), 0, &n3ds::kTriangles[0][0], 0};
+  const N3DS_3D_MODEL model = {vertices.data(), 0, &kTriangles[0][0], 0};
   WarpScene scene;
   TestPicture texture = GradientTexture(64, 64);
   TestPicture expected = Canvas(80, 90);
-  n3ds_test::WarpReference(vertices.data(), model.triangles, upward.data(), model.triangles,
-                           scene.camera, texture, expected);
+  WarpReference(vertices.data(), model.triangles, upward.data(), model.triangles, scene.camera,
+                texture, expected);
   ASSERT_GT(Covered(expected).size(), 2000u);
 
   for (int missing = 0; missing < 3; ++missing) {
@@ -413,18 +406,18 @@ TEST(WarpFace, MissingArrayBringsTheDefaultLayoutWhateverTheCounts) {
     if (missing != 1) mask.texCoords = nullptr;
     if (missing != 0) mask.triangles = nullptr;
     TestPicture output = Canvas(80, 90);
-    ASSERT_EQ(n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t,
-                             output.descriptor()),
-              N3DS_OK);
+    ASSERT_EQ(
+        WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
+        N3DS_OK);
     EXPECT_EQ(output.Bytes(), expected.Bytes()) << missing;
   }
 }
 
 TEST(WarpFace, DefaultLayoutStartsWithTheTableOfTheMesh) {
-  EXPECT_FLOAT_EQ(n3ds::kTextureCoordinates[0][0], 0.069524f);
-  EXPECT_FLOAT_EQ(1.0f - n3ds::kTextureCoordinates[0][1], 0.718051f);
-  EXPECT_FLOAT_EQ(1.0f - n3ds::kTextureCoordinates[1][1], 0.680544f);
-  EXPECT_FLOAT_EQ(1.0f - n3ds::kTextureCoordinates[2][1], 0.681845f);
+  EXPECT_FLOAT_EQ(kTextureCoordinates[0][0], 0.069524f);
+  EXPECT_FLOAT_EQ(1.0f - kTextureCoordinates[0][1], 0.718051f);
+  EXPECT_FLOAT_EQ(1.0f - kTextureCoordinates[1][1], 0.680544f);
+  EXPECT_FLOAT_EQ(1.0f - kTextureCoordinates[2][1], 0.681845f);
 }
 
 TEST(WarpFace, TextureAndMeshMayBeCutDifferently) {
@@ -438,12 +431,12 @@ TEST(WarpFace, TextureAndMeshMayBeCutDifferently) {
   const N3DS_3D_MODEL model = scene.Model();
   N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
   mask.triangles = turned.data();
-  ASSERT_EQ(n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t,
-                           output.descriptor()),
-            N3DS_OK);
+  ASSERT_EQ(
+      WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
+      N3DS_OK);
   TestPicture expected = Canvas(16, 16);
-  n3ds_test::WarpReference(model.vertices, model.triangles, mask.texCoords, turned.data(),
-                           scene.camera, texture, expected);
+  WarpReference(model.vertices, model.triangles, mask.texCoords, turned.data(), scene.camera,
+                texture, expected);
   EXPECT_EQ(output.Bytes(), expected.Bytes());
   EXPECT_GT(output.Pixel(0, 0)[1], 40) << "corner 0 shows the texture's third corner";
 }
@@ -458,9 +451,9 @@ TEST(WarpFace, TextureTrianglesBeyondTheCoordinatesAreLeftOut) {
   const N3DS_3D_MODEL model = scene.Model();
   N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
   mask.triangles = triangles.data();
-  ASSERT_EQ(n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t,
-                           output.descriptor()),
-            N3DS_OK);
+  ASSERT_EQ(
+      WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
+      N3DS_OK);
   EXPECT_TRUE(Covered(output).empty());
 }
 
@@ -522,7 +515,7 @@ TEST(WarpFace, TextureCoordinatesThatAreNoNumbersGiveZeroBytes) {
 }
 
 TEST(WarpFace, FacesPartlyAndWhollyOutsideStayInsideTheBuffer) {
-  std::mt19937 random(24);
+  Random random = TestRandom();
   TestPicture texture = GradientTexture(32, 32);
   for (const auto& [x, y] : {std::pair(-30.0f, 5.0f),
                              {25.0f, 5.0f},
@@ -561,9 +554,9 @@ TEST(WarpFace, RowsShorterThanTheWidthAreNotOverrun) {
   output.width = 16;
   const N3DS_3D_MODEL model = scene.Model();
   const N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
-  ASSERT_EQ(n3ds::WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output),
-            N3DS_OK);
+  ASSERT_EQ(WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output), N3DS_OK);
   EXPECT_EQ(Covered(narrow).count({8, 15}), 1u);
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -9,7 +9,7 @@
 
 #include "mask/test_picture.h"
 
-namespace n3ds_test {
+namespace n3ds::testing {
 
 struct ReferenceCamera {
   float K[9], R[9], t[3];
@@ -163,4 +163,4 @@ inline void WarpReference(const float* vertices, const uint16_t* mesh, const flo
   }
 }
 
-}  // namespace n3ds_test
+}  // namespace n3ds::testing

@@ -11,7 +11,7 @@
 #include "mask/warp_reference.h"
 #include "norvale_3d_sticker_core.h"
 
-namespace n3ds_test {
+namespace n3ds::testing {
 
 // An image point with the texture point that belongs there (v up).
 struct WarpCorner {
@@ -91,4 +91,4 @@ inline TestPicture GradientTexture(int width, int height) {
   return texture;
 }
 
-}  // namespace n3ds_test
+}  // namespace n3ds::testing

@@ -4,7 +4,10 @@
 #include <set>
 #include <vector>
 
-#include "math/math_testing.h"
+#include "support/bits.h"
+#include "support/captured_output.h"
+#include "support/memory_pool.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -13,14 +16,14 @@ constexpr float kUnwritten = -123.25f;
 
 using Vector = std::vector<float>;  // of exactly the promised size, so that sanitizers see more
 
-Vector RandomVector(std::mt19937& random, size_t size) {
+Vector RandomVector(Random& random, size_t size) {
   Vector v(size);
-  for (float& value : v) value = Uniform(random, -1, 1);
+  for (float& value : v) value = random.Float(-1, 1);
   return v;
 }
 
 // Random with a heavy diagonal: factorises without pivoting.
-Vector RandomSquare(std::mt19937& random, int n) {
+Vector RandomSquare(Random& random, int n) {
   Vector a = RandomVector(random, static_cast<size_t>(n) * n);
   for (int i = 0; i < n; ++i) a[i * n + i] += a[i * n + i] < 0 ? -n : n;
   return a;
@@ -73,7 +76,7 @@ std::vector<double> SolveInDouble(std::vector<double> a, std::vector<double> b) 
 }
 
 TEST(MatDecompLUTest, EqualsTheElementwiseDefinitionBitForBit) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int n = 1; n <= 24; ++n) {
     const Vector A = RandomSquare(random, n);
     const size_t size = A.size();
@@ -86,7 +89,7 @@ TEST(MatDecompLUTest, EqualsTheElementwiseDefinitionBitForBit) {
 }
 
 TEST(MatDecompLUTest, FactorsAreTriangularAndMultiplyToTheMatrix) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const int n = 20;
   const Vector A = RandomSquare(random, n);
   Vector L(n * n, kUnwritten), U(n * n, kUnwritten);
@@ -189,7 +192,7 @@ TEST(SolveLinearAxbTest, ZeroLeadingElementFailsThoughTheMatrixIsRegular) {
 }
 
 TEST(SolveLinearAxbTest, SquareSystemsAgreeWithDoublePrecision) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int n = 1; n <= 20; ++n) {
     const Vector A = RandomSquare(random, n), b = RandomVector(random, n);
     Vector x(n, kUnwritten);
@@ -200,7 +203,7 @@ TEST(SolveLinearAxbTest, SquareSystemsAgreeWithDoublePrecision) {
 }
 
 TEST(SolveLinearAxbTest, RightHandSideMayBeTheSolutionArray) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const int n = 7;
   const Vector A = RandomSquare(random, n), b = RandomVector(random, n);
   Vector apart(n), shared = b;
@@ -226,7 +229,7 @@ TEST(SolveLinearAxbTest, InconsistentTallSystemGetsTheLeastSquaresSolution) {
 }
 
 TEST(SolveLinearAxbTest, TallSystemsAgreeWithDoublePrecision) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const struct {
     int rows, cols;
   } sizes[] = {{2, 1}, {8, 7}, {54, 16}, {140, 20}, {210, 20}, {266, 16}};
@@ -252,7 +255,7 @@ TEST(SolveLinearAxbTest, TallSystemsAgreeWithDoublePrecision) {
 }
 
 TEST(SolveLinearAxbTest, TallSystemIsSolvedThroughFusedNormalEquationsBitForBit) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const int rows = 30, cols = 5;
   const Vector A = RandomVector(random, rows * cols), b = RandomVector(random, rows);
   Vector normal(cols * cols, 0.0f), moment(cols, 0.0f);
@@ -296,7 +299,7 @@ TEST(SolveLinearAxbTest, RankDeficientTallSystemFailsAndLeavesTheSolution) {
 TEST(SolveLinearAxbTest, BadSizesAreRefusedWithoutAllocating) {
   const Vector A(4, 1.0f), b(2, 1.0f);
   Vector x(2, kUnwritten);
-  const Pool pool(64);  // too small for any of the scratch: an allocation would give -201
+  const MemoryPool pool(64);  // too small for any of the scratch: an allocation would give -201
   const auto solve = [&](int rows, int cols) {
     return SolveLinearAxb(pool.handle(), A.data(), rows, cols, x.data(), b.data());
   };
@@ -329,7 +332,7 @@ TEST(SolveLinearAxbTest, NullPointersAreRefusedBeforeTheSizesAreLookedAt) {
 // Pools from too small for anything to big enough, in steps finer than any allocation: each
 // allocation is the one that fails for some of them.
 void ExpectCleanFailureOfEveryAllocation(int rows, int cols) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const Vector A = rows == cols ? RandomSquare(random, cols)
                                 : RandomVector(random, static_cast<size_t>(rows) * cols);
   const Vector b = RandomVector(random, rows);
@@ -338,7 +341,7 @@ void ExpectCleanFailureOfEveryAllocation(int rows, int cols) {
   int failures = 0;
   for (size_t length = 40;; length += 8) {
     ASSERT_LT(length, 100000u);
-    const Pool pool(length);
+    const MemoryPool pool(length);
     Vector x(cols, kUnwritten);
     const MRESULT status = SolveLinearAxb(pool.handle(), A.data(), rows, cols, x.data(), b.data());
     ASSERT_TRUE(pool.Untouched()) << "scratch not released with a pool of " << length;
@@ -362,7 +365,7 @@ TEST(SolveLinearAxbTest, EveryFailedAllocationOfATallSolveIsReportedAndReleasesT
 }
 
 TEST(SolveLinearAxbTest, SingularSystemReleasesItsScratch) {
-  const Pool pool(4096);
+  const MemoryPool pool(4096);
   const Vector A = {1, 1, 2, 2, 3, 3}, b = {1, 2, 3};
   Vector x(2);
   PrintedBy([&] {

@@ -12,8 +12,8 @@
 #include <cstdlib>
 #include <vector>
 
-#include "math/pose_scene.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/pose_scene.h"
 
 namespace n3ds::testing {
 

@@ -5,9 +5,12 @@
 #include <map>
 #include <sstream>
 
-#include "math/math_testing.h"
 #include "math/pose_reference.h"
-#include "math/pose_scene.h"
+#include "support/bits.h"
+#include "support/captured_output.h"
+#include "support/memory_pool.h"
+#include "support/pose_scene.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -52,19 +55,19 @@ enum class Line { kVertical, kHorizontal, kOblique };
 
 // Landmarks of another pose, some pixels off, with the chin put where the middle line is of the
 // wanted kind.
-PoseCase RandomCase(std::mt19937& random, const Pose& pose, Line line, float error) {
+PoseCase RandomCase(Random& random, const Pose& pose, Line line, float error) {
   PoseCase c;
   c.model = MakeHead();
   c.camera = MakeCamera(1280, 720);
   c.landmarks = Project(c.model, c.camera, pose);
-  for (float& v : c.landmarks) v += Uniform(random, -error, error);
+  for (float& v : c.landmarks) v += random.Float(-error, error);
   const ReferenceLine now = ReferenceMiddleLine(c);
   if (line == Line::kVertical) c.landmarks[2 * 9] = static_cast<float>(now.bx) + 0.5f;
   if (line == Line::kHorizontal) c.landmarks[2 * 9 + 1] = static_cast<float>(now.by) + 0.5f;
-  c.contour_weight = Uniform(random, 0.2f, 2.0f);
-  c.range_weight = Uniform(random, 0.1f, 1.5f);
-  c.mode = static_cast<int64_t>(random() % 2);
-  c.inner_weight = Uniform(random, 0.1f, 2.5f);
+  c.contour_weight = random.Float(0.2f, 2.0f);
+  c.range_weight = random.Float(0.1f, 1.5f);
+  c.mode = static_cast<int64_t>(random.Below(2));
+  c.inner_weight = random.Float(0.1f, 2.5f);
   return c;
 }
 
@@ -95,14 +98,14 @@ const Pose kFrontal = MakePose(0.1f, 0.2f, -0.05f, 10, -20, 700);
 // --- The definition --------------------------------------------------------------------------
 
 TEST(ComputeJacobianEtcTest, EqualsTheElementwiseDefinitionBitForBit) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   std::map<OutlineRule, int> seen;
   for (int run = 0; run < 600; ++run) {
     const Pose seen_pose = RandomPose(random);
     const auto line = static_cast<Line>(run % 3);
     const PoseCase c = RandomCase(random, seen_pose, line, 12);
     Pose pose = seen_pose;
-    for (float& v : pose) v *= Uniform(random, 0.97f, 1.03f);
+    for (float& v : pose) v *= random.Float(0.97f, 1.03f);
 
     const ReferenceEvaluation expected = ReferenceEvaluate(c, pose.data());
     const Evaluation e = Evaluate(c, pose);
@@ -123,13 +126,13 @@ TEST(ComputeJacobianEtcTest, EqualsTheElementwiseDefinitionBitForBit) {
 }
 
 TEST(ComputeJacobianEtcTest, JacobianMatchesCentralDifferencesUnderEveryWeighting) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   std::map<std::pair<OutlineRule, bool>, int> seen;
   for (int run = 0; run < 120; ++run) {
     const Pose truth = RandomPose(random);
     const PoseCase c = RandomCase(random, truth, static_cast<Line>(run % 3), 12);
     Pose pose = truth;
-    for (float& v : pose) v *= Uniform(random, 0.98f, 1.02f);
+    for (float& v : pose) v *= random.Float(0.98f, 1.02f);
     const Evaluation e = Evaluate(c, pose);
     ASSERT_EQ(e.status, N3DS_OK);
 
@@ -572,7 +575,7 @@ TEST(ComputeJacobianEtcTest, NoPointsGiveZeroNormalEquations) {
 }
 
 TEST(ComputeJacobianEtcTest, FewerParametersGetOnlyTheirColumns) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const PoseCase c = RandomCase(random, kFrontal, Line::kOblique, 8);
   const Evaluation full = Evaluate(c, kFrontal);
   for (int params = 0; params < 7; ++params) {
@@ -590,7 +593,7 @@ TEST(ComputeJacobianEtcTest, FewerParametersGetOnlyTheirColumns) {
 }
 
 TEST(ComputeJacobianEtcTest, ColumnsBeyondTheSeventhAreOnlyWeighted) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   const PoseCase c = RandomCase(random, kFrontal, Line::kOblique, 8);
   const Evaluation full = Evaluate(c, kFrontal);
   const Evaluation e = Evaluate(c, kFrontal, 18);  // every column starts as kUnwritten
@@ -619,7 +622,7 @@ TEST(ComputeJacobianEtcTest, ColumnsBeyondTheSeventhAreOnlyWeighted) {
 TEST(ComputeJacobianEtcTest, TransposeThatCannotBeHadIsReported) {
   const PoseCase c = ExactCase(kFrontal);
   const size_t needed = 7 * 190 * sizeof(float) + 32;
-  const Pool small(needed - 8), enough(needed);
+  const MemoryPool small(needed - 8), enough(needed);
   const Evaluation e = Evaluate(c, kFrontal, 7, small.handle());
   EXPECT_EQ(e.status, N3DS_NO_MEMORY);
   EXPECT_EQ(e.JtJ, std::vector<float>(49, kUnwritten));

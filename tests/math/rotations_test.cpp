@@ -3,7 +3,8 @@
 #include <cmath>
 #include <limits>
 
-#include "math/math_testing.h"
+#include "support/face_scene.h"
+#include "support/test_random.h"
 
 namespace n3ds::testing {
 namespace {
@@ -41,10 +42,10 @@ Quat QuatFromEuler(const Vec3& e) {
   return q;
 }
 
-Quat RandomUnitQuat(std::mt19937& random) {
+Quat RandomUnitQuat(Random& random) {
   while (true) {
-    const Quat q = {Uniform(random, -1, 1), Uniform(random, -1, 1), Uniform(random, -1, 1),
-                    Uniform(random, -1, 1)};
+    const Quat q = {random.Float(-1, 1), random.Float(-1, 1), random.Float(-1, 1),
+                    random.Float(-1, 1)};
     const float n = q[0] * q[0] + q[1] * q[1] + q[2] * q[2] + q[3] * q[3];
     if (n > 1.0f || n < 0.01f) continue;
     const float s = 1.0f / std::sqrt(n);
@@ -94,7 +95,7 @@ TEST(QuatToRotationMatrixTest, ZeroQuaternionGivesZeroMatrix) {
 }
 
 TEST(QuatToRotationMatrixTest, TurnsColumnVectorsAsTheQuaternionDoes) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     const Quat q = RandomUnitQuat(random);
     const Mat3 m = MatrixOf(q);
@@ -108,10 +109,10 @@ TEST(QuatToRotationMatrixTest, TurnsColumnVectorsAsTheQuaternionDoes) {
 }
 
 TEST(QuatToRotationMatrixTest, AnyLengthScalesAllNineElementsByItsSquare) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     const Quat q = RandomUnitQuat(random);
-    const float length = Uniform(random, 0.1f, 3.0f);
+    const float length = random.Float(0.1f, 3.0f);
     const Mat3 unit = MatrixOf(q);
     const Mat3 scaled = MatrixOf({q[0] * length, q[1] * length, q[2] * length, q[3] * length});
     for (int i = 0; i < 9; ++i) ASSERT_NEAR(scaled[i], unit[i] * length * length, 1e-5);
@@ -145,7 +146,7 @@ TEST(RotationMatrixToQuatTest, TiesGoToTheEarlierComponent) {
 }
 
 TEST(RotationMatrixToQuatTest, RoundTripsWithTheLargestComponentPositive) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   int chosen[4] = {};
   for (int run = 0; run < 400; ++run) {
     Quat q = RandomUnitQuat(random);
@@ -187,10 +188,10 @@ TEST(QuatToEulerTest, AnglesStandInTheOrderRollPitchYaw) {
 }
 
 TEST(EulerToQuatTest, BuildsRollThenPitchThenYaw) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
-    const Vec3 e = {Uniform(random, -3.1f, 3.1f), Uniform(random, -3.1f, 3.1f),
-                    Uniform(random, -3.1f, 3.1f)};
+    const Vec3 e = {random.Float(-3.1f, 3.1f), random.Float(-3.1f, 3.1f),
+                    random.Float(-3.1f, 3.1f)};
     const Mat3 m = MatrixOf(QuatFromEuler(e));
     const auto expected = MatrixOfEuler(e[0], e[1], e[2]);
     for (int i = 0; i < 9; ++i) ASSERT_NEAR(m[i], expected[i], 1e-6);
@@ -198,10 +199,10 @@ TEST(EulerToQuatTest, BuildsRollThenPitchThenYaw) {
 }
 
 TEST(EulerToQuatTest, RoundTripsThroughEulerForPitchInsideARightAngle) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int run = 0; run < 400; ++run) {
-    const Vec3 e = {Uniform(random, -3.14f, 3.14f), Uniform(random, -1.5f, 1.5f),
-                    Uniform(random, -3.14f, 3.14f)};
+    const Vec3 e = {random.Float(-3.14f, 3.14f), random.Float(-1.5f, 1.5f),
+                    random.Float(-3.14f, 3.14f)};
     const Vec3 back = EulerOf(QuatFromEuler(e));
     // The sine flattens toward the right angle, so the accuracy falls off with its cosine.
     const double tolerance = 2e-6 / std::cos(e[1]);
@@ -232,11 +233,11 @@ TEST(MatrixInverse3X3Test, TinyDeterminantIsStillInverted) {
 }
 
 TEST(MatrixInverse3X3Test, ProductWithTheInverseIsTheIdentity) {
-  auto random = MakeRandom();
+  Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     // Diagonally dominant, so well conditioned.
     Mat3 m;
-    for (int i = 0; i < 9; ++i) m[i] = Uniform(random, -1, 1) + (i % 4 == 0 ? 4.0f : 0.0f);
+    for (int i = 0; i < 9; ++i) m[i] = random.Float(-1, 1) + (i % 4 == 0 ? 4.0f : 0.0f);
     Mat3 inverse;
     ASSERT_EQ(MatrixInverse3X3(m.data(), inverse.data()), N3DS_OK);
     for (int r = 0; r < 3; ++r) {

@@ -10,12 +10,11 @@
 #include "platform/cpu_testing.h"
 #include "platform/task_pool.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
 using ::testing::Each;
 using ::testing::ElementsAre;
-using testing::FakeCpus;
 
 // A pool of one worker on a machine of fake cores, whose switches hold the given characters.
 class CpuSwitch : public ::testing::Test {
@@ -213,4 +212,4 @@ TEST_F(CpuSwitch, NullPoolIsIgnored) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -8,13 +8,11 @@
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::GuardedArray;
-using testing::RandomValues;
 
 TEST(ScaleDownBy2, TruncatesTheMean) {
   std::vector<uint8_t> src(16, 0);
@@ -27,10 +25,10 @@ TEST(ScaleDownBy2, TruncatesTheMean) {
 }
 
 TEST(ScaleDownBy2, RandomSizes) {
-  RandomValues random(1);
+  Random random = TestRandom();
   for (int trial = 0; trial < 60; ++trial) {
-    const int width = static_cast<int>(random.Integer(4, 75));
-    const int height = static_cast<int>(random.Integer(4, 20));
+    const int width = random.Int(4, 75);
+    const int height = random.Int(4, 20);
     GuardedArray<uint8_t> src(random.Integers<uint8_t>(static_cast<size_t>(width) * height));
     GuardedArray<uint8_t> dst(static_cast<size_t>(width / 2) * (height / 2));
     ASSERT_EQ(mcvScaleDownBy2u8(src.data(), width, height, dst.data()), 0);
@@ -60,13 +58,13 @@ TEST(ScaleDownBy2, BadArguments) {
 }
 
 TEST(BitwiseOr, RandomSizesAndPitches) {
-  RandomValues random(2);
+  Random random = TestRandom();
   for (int trial = 0; trial < 60; ++trial) {
-    const int width = static_cast<int>(random.Integer(1, 70));
-    const int height = static_cast<int>(random.Integer(1, 6));
-    const int pitch_a = width + static_cast<int>(random.Integer(0, 9));
-    const int pitch_b = width + static_cast<int>(random.Integer(0, 9));
-    const int pitch_dst = width + static_cast<int>(random.Integer(0, 9));
+    const int width = random.Int(1, 70);
+    const int height = random.Int(1, 6);
+    const int pitch_a = width + random.Int(0, 9);
+    const int pitch_b = width + random.Int(0, 9);
+    const int pitch_dst = width + random.Int(0, 9);
     // The last row ends with the picture, not with the pitch.
     const auto bytes = [&](int pitch) { return static_cast<size_t>(pitch * (height - 1) + width); };
     GuardedArray<uint8_t> a(random.Integers<uint8_t>(bytes(pitch_a)));
@@ -118,10 +116,10 @@ TEST(YuyvSplit, SeparatesLumaAndChroma) {
 }
 
 TEST(YuyvSplit, RandomSizesKeepEveryRow) {
-  RandomValues random(3);
+  Random random = TestRandom();
   for (int trial = 0; trial < 60; ++trial) {
-    const int width = static_cast<int>(random.Integer(1, 70));
-    const int height = static_cast<int>(random.Integer(1, 6));
+    const int width = random.Int(1, 70);
+    const int height = random.Int(1, 6);
     const int src_pitch = (2 * width + 3) / 4 * 4;
     const int dst_pitch = (width + 3) / 4 * 4;
     GuardedArray<uint8_t> src(random.Integers<uint8_t>(static_cast<size_t>(src_pitch) * height));
@@ -202,16 +200,16 @@ TEST_F(DetectMotion, MarksPixelsThatDifferFromBothNeighbours) {
 }
 
 TEST_F(DetectMotion, RandomPicturesWithPlanesOfDifferentSizes) {
-  RandomValues random(4);
+  Random random = TestRandom();
   for (int trial = 0; trial < 40; ++trial) {
-    const int64_t width = random.Integer(1, 40);
+    const int64_t width = random.Int(1, 40);
     const auto planes = [&](int64_t h0, int64_t h1, int64_t h2) {
       // Levels from a narrow band, so that differences lie around the threshold.
       std::array<std::vector<uint8_t>, 3> pixels;
       const int64_t heights[3] = {h0, h1, h2};
       for (size_t i = 0; i < 3; ++i) {
         pixels[i].resize(static_cast<size_t>(width * heights[i]));
-        for (uint8_t& pixel : pixels[i]) pixel = static_cast<uint8_t>(random.Integer(100, 140));
+        for (uint8_t& pixel : pixels[i]) pixel = static_cast<uint8_t>(random.Int(100, 140));
       }
       return Picture(pixels, width);
     };
@@ -276,4 +274,4 @@ TEST_F(DetectMotion, SizesThatDifferOrAreEmpty) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -6,13 +6,11 @@
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::GuardedArray;
-using testing::RandomValues;
 
 constexpr int kUntouched = 0x5A;
 
@@ -23,11 +21,11 @@ struct Source {
   std::vector<uint8_t> pixels;
 };
 
-Source RandomSource(RandomValues& random, bool padded) {
+Source RandomSource(Random& random, bool padded) {
   Source source;
-  source.width = static_cast<int>(random.Integer(1, 40));
-  source.height = static_cast<int>(random.Integer(1, 12));
-  source.pitch = source.width + (padded ? static_cast<int>(random.Integer(0, 7)) : 0);
+  source.width = random.Int(1, 40);
+  source.height = random.Int(1, 12);
+  source.pitch = source.width + (padded ? random.Int(0, 7) : 0);
   source.pixels = random.Integers<uint8_t>(static_cast<size_t>(source.pitch) * (source.height - 1) +
                                            source.width);
   return source;
@@ -84,7 +82,7 @@ TEST(IntegralImage, LeadingZerosAndSums) {
 }
 
 TEST(IntegralImage, RandomSizesWithEitherOutputMissing) {
-  RandomValues random(1);
+  Random random = TestRandom();
   for (int trial = 0; trial < 60; ++trial) {
     const Source source = RandomSource(random, false);
     GuardedArray<uint8_t> src(source.pixels);
@@ -101,7 +99,7 @@ TEST(IntegralImage, RandomSizesWithEitherOutputMissing) {
 }
 
 TEST(IntegralImage, Pitched32BitFormHasLeadingZerosIfThePitchLeavesRoom) {
-  RandomValues random(2);
+  Random random = TestRandom();
   for (int trial = 0; trial < 90; ++trial) {
     const Source source = RandomSource(random, true);
     GuardedArray<uint8_t> src(source.pixels);
@@ -120,7 +118,7 @@ TEST(IntegralImage, Pitched32BitFormHasLeadingZerosIfThePitchLeavesRoom) {
 }
 
 TEST(IntegralImage, Pitched16BitFormWrapsAndHasTwoPitches) {
-  RandomValues random(3);
+  Random random = TestRandom();
   for (int trial = 0; trial < 90; ++trial) {
     const Source source = RandomSource(random, true);  // often beyond 65535 in total
     GuardedArray<uint8_t> src(source.pixels);
@@ -189,4 +187,4 @@ TEST(IntegralImage, EmptyPicturesHaveTheirZerosOnly) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -5,15 +5,12 @@
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/bits.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::FirstDifference;
-using testing::GuardedArray;
-using testing::RandomValues;
-using testing::SameBits;
 
 // No compiler of ours lacks it, though it is no part of the language.
 __extension__ typedef __int128 Int128;
@@ -30,16 +27,15 @@ struct Sizes {
   size_t mn() const { return static_cast<size_t>(m) * n; }
 };
 
-Sizes RandomSizes(RandomValues& random) {
-  return {static_cast<int>(random.Integer(1, 17)), static_cast<int>(random.Integer(0, 20)),
-          static_cast<int>(random.Integer(1, 17))};
+Sizes RandomSizes(Random& random) {
+  return {random.Int(1, 17), random.Int(0, 20), random.Int(1, 17)};
 }
 
 TEST(MatrixElementKernels, FloatFormsOnRandomSizes) {
-  RandomValues random(1);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
-    const int rows = static_cast<int>(random.Integer(1, 9));
-    const int cols = static_cast<int>(random.Integer(1, 13));
+    const int rows = random.Int(1, 9);
+    const int cols = random.Int(1, 13);
     const size_t count = static_cast<size_t>(rows) * cols;
     GuardedArray<float> a(random.AwkwardFloats(count));
     GuardedArray<float> b(random.AwkwardFloats(count));
@@ -66,10 +62,10 @@ TEST(MatrixElementKernels, FloatFormsOnRandomSizes) {
 }
 
 TEST(MatrixElementKernels, IntegerFormsWrapOnRandomSizes) {
-  RandomValues random(2);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
-    const int rows = static_cast<int>(random.Integer(1, 9));
-    const int cols = static_cast<int>(random.Integer(1, 13));
+    const int rows = random.Int(1, 9);
+    const int cols = random.Int(1, 13);
     const size_t count = static_cast<size_t>(rows) * cols;
     GuardedArray<int32_t> a(random.Integers<int32_t>(count));
     GuardedArray<int32_t> b(random.Integers<int32_t>(count));
@@ -123,7 +119,7 @@ TEST(MatrixElementKernels, NullMatrixIsRefusedWhateverTheSizes) {
 }
 
 TEST(MatrixProducts, IntegerRowMajorWrapsOnRandomSizes) {
-  RandomValues random(3);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
     const Sizes size = RandomSizes(random);
     GuardedArray<int32_t> A(random.Integers<int32_t>(size.mk()));
@@ -143,7 +139,7 @@ TEST(MatrixProducts, IntegerRowMajorWrapsOnRandomSizes) {
 }
 
 TEST(MatrixProducts, WideSumsTakeProductsOf32Bits) {
-  RandomValues random(4);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
     const Sizes size = RandomSizes(random);
     GuardedArray<int16_t> A(random.Integers<int16_t>(size.mk()));
@@ -171,7 +167,7 @@ TEST(MatrixProducts, WideSumsTakeProductsOf32Bits) {
 }
 
 TEST(MatrixProducts, ColumnMajorFormsOnRandomSizes) {
-  RandomValues random(5);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
     const Sizes size = RandomSizes(random);
     GuardedArray<float> A(random.Floats(size.mk()));
@@ -192,7 +188,7 @@ TEST(MatrixProducts, ColumnMajorFormsOnRandomSizes) {
           sum = std::fma(A[p * size.m + i], B[j * size.k + p], sum);
           integer_sum += Int128{Ai[p * size.m + i]} * Bi[j * size.k + p];
         }
-        ASSERT_TRUE(SameBits(C[j * size.m + i], sum));
+        ASSERT_TRUE(SameBitsOrNan(C[j * size.m + i], sum));
         ASSERT_EQ(Ci[j * size.m + i], Low32(integer_sum));
       }
     }
@@ -200,7 +196,7 @@ TEST(MatrixProducts, ColumnMajorFormsOnRandomSizes) {
 }
 
 TEST(MatrixProducts, MultiplyAddFormsAddAfterTheProduct) {
-  RandomValues random(6);
+  Random random = TestRandom();
   for (int trial = 0; trial < 100; ++trial) {
     const Sizes size = RandomSizes(random);
     GuardedArray<float> A(random.Floats(size.mk()));
@@ -225,7 +221,7 @@ TEST(MatrixProducts, MultiplyAddFormsAddAfterTheProduct) {
           sum = std::fma(A[i * size.k + p], B[p * size.n + j], sum);
           integer_sum += Int128{Ai[i * size.k + p]} * Bi[p * size.n + j];
         }
-        ASSERT_TRUE(SameBits(D[i * size.n + j], sum + E[i * size.n + j]));
+        ASSERT_TRUE(SameBitsOrNan(D[i * size.n + j], sum + E[i * size.n + j]));
         ASSERT_EQ(Di[i * size.n + j], Low32(integer_sum));
       }
     }
@@ -248,7 +244,7 @@ TEST(MatrixProducts, WithoutTermsAreZero) {
     EXPECT_EQ(C[0] | C[1], 0);
     float F[2] = {7.0f, 7.0f};
     EXPECT_EQ(mcvMatrixMulMatrixColMajor_f32(F, &f, &f, 2, k, 1), 0);
-    EXPECT_TRUE(SameBits(F[0], 0.0f) && SameBits(F[1], 0.0f));
+    EXPECT_TRUE(SameBitsOrNan(F[0], 0.0f) && SameBitsOrNan(F[1], 0.0f));
     const int32_t E[2] = {3, -4};
     EXPECT_EQ(mcvMatrixMulAddRowMajor_s32(C, &a, &a, E, 1, k, 2), 0);
     EXPECT_TRUE(C[0] == 3 && C[1] == -4);
@@ -317,4 +313,4 @@ TEST(MatrixProducts, NullMatrixIsRefusedWhateverTheSizes) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

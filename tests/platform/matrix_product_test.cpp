@@ -4,15 +4,12 @@
 #include <gtest/gtest.h>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/bits.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::FirstDifference;
-using testing::GuardedArray;
-using testing::RandomValues;
-using testing::SameBits;
 
 constexpr float kUntouched = 12345.0f;
 
@@ -54,7 +51,7 @@ void CheckAllForms(const std::vector<float>& A, const std::vector<float>& B, int
   ASSERT_EQ(FirstDifference(Run(exported, A, B, m, k, n), expected), -1);
 }
 
-void CheckRandom(RandomValues& random, int m, int k, int n, bool awkward) {
+void CheckRandom(Random& random, int m, int k, int n, bool awkward) {
   const size_t a_size = static_cast<size_t>(m) * k;
   const size_t b_size = static_cast<size_t>(k) * n;
   const auto A = awkward ? random.AwkwardFloats(a_size) : random.Floats(a_size);
@@ -74,7 +71,7 @@ TEST(MatrixProduct, SimdFormExistsWhereTheProcessorHasOne) {
 }
 
 TEST(MatrixProduct, SameBitsAsTheDefinitionAtTheSizesOfTheFits) {
-  RandomValues random(1);
+  Random random = TestRandom();
   for (const bool awkward : {false, true}) {
     CheckRandom(random, 7, 190, 7, awkward);
     CheckRandom(random, 7, 190, 1, awkward);
@@ -86,7 +83,7 @@ TEST(MatrixProduct, SameBitsAsTheDefinitionAtTheSizesOfTheFits) {
 }
 
 TEST(MatrixProduct, SameBitsAsTheDefinitionAtEveryWidthAndHeight) {
-  RandomValues random(2);
+  Random random = TestRandom();
   for (int n = 1; n <= 36; ++n) {
     for (int m = 1; m <= 10; ++m) CheckRandom(random, m, 5, n, m % 2 == 0);
     CheckRandom(random, 33, 7, n, false);
@@ -94,11 +91,11 @@ TEST(MatrixProduct, SameBitsAsTheDefinitionAtEveryWidthAndHeight) {
 }
 
 TEST(MatrixProduct, SameBitsAsTheDefinitionAtRandomSizes) {
-  RandomValues random(3);
+  Random random = TestRandom();
   for (int trial = 0; trial < 300; ++trial) {
-    const int m = static_cast<int>(random.Integer(1, 40));
-    const int k = static_cast<int>(random.Integer(0, 60));
-    const int n = static_cast<int>(random.Integer(1, 50));
+    const int m = random.Int(1, 40);
+    const int k = random.Int(0, 60);
+    const int n = random.Int(1, 50);
     CheckRandom(random, m, k, n, trial % 3 == 0);
   }
 }
@@ -108,7 +105,7 @@ TEST(MatrixProduct, KeepsDenormalTerms) {
   const std::vector<float> A(9, 0x1p-75f);
   const std::vector<float> B(9 * 9, 0x1p-74f);
   CheckAllForms(A, B, 1, 9, 9);
-  EXPECT_TRUE(SameBits(Expected(A, B, 1, 9, 9)[8], 9 * 0x1p-149f));
+  EXPECT_TRUE(SameBitsOrNan(Expected(A, B, 1, 9, 9)[8], 9 * 0x1p-149f));
 }
 
 TEST(MatrixProduct, RoundsOncePerTerm) {
@@ -135,7 +132,7 @@ TEST(MatrixProduct, WithoutTermsIsZero) {
     for (const int n : {1, 3, 20}) {
       std::vector<float> C(static_cast<size_t>(2) * n, kUntouched);
       ASSERT_EQ(mcvMatrixMulMatrixRowMajor_f32(C.data(), &unused, &unused, 2, k, n), N3DS_OK);
-      for (const float c : C) EXPECT_TRUE(SameBits(c, 0.0f));
+      for (const float c : C) EXPECT_TRUE(SameBitsOrNan(c, 0.0f));
     }
   }
 }
@@ -162,4 +159,4 @@ TEST(MatrixProduct, NullMatrixIsRefusedWhateverTheSizes) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

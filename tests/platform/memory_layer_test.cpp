@@ -5,10 +5,11 @@
 #include <cstdint>
 #include <cstring>
 #include <memory>
-#include <random>
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
+#include "support/test_random.h"
+namespace n3ds::testing {
 
 namespace {
 
@@ -470,8 +471,8 @@ TEST(MemoryPool, FollowsTheModelOverRandomOperations) {
   Pool pool(kPayload);
   ChainModel model(kPayload);
   unsigned char* const base = static_cast<unsigned char*>(pool.handle()) + 16;
-  std::mt19937 random(20240517);
-  const auto below = [&random](uint32_t limit) { return random() % limit; };
+  Random random = TestRandom();
+  const auto below = [&random](uint32_t limit) { return random.Below(limit); };
   // Mostly small sizes around the splitting limits, some that only fit a nearly empty pool.
   const auto random_size = [&below] {
     return 1 + (below(20) == 0 ? below(6000) : below(8) == 0 ? below(600) : below(120));
@@ -541,3 +542,4 @@ TEST(MemoryPool, FollowsTheModelOverRandomOperations) {
 }
 
 }  // namespace
+}  // namespace n3ds::testing

@@ -6,15 +6,12 @@
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/bits.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::FirstDifference;
-using testing::GuardedArray;
-using testing::RandomValues;
-using testing::SameBits;
 
 float ExpectedInverseSqrt(float x) {
   int64_t bits = 0;
@@ -36,9 +33,9 @@ float ExpectedInverseSqrt(float x) {
 
 TEST(SquareRoot, IsTheRoundedRoot) {
   EXPECT_EQ(mcvSqrtf32(2.0f), 1.41421354f);
-  EXPECT_TRUE(SameBits(mcvSqrtf32(-0.0f), -0.0f));
+  EXPECT_TRUE(SameBitsOrNan(mcvSqrtf32(-0.0f), -0.0f));
   EXPECT_TRUE(std::isnan(mcvSqrtf32(-1.0f)));
-  RandomValues random(1);
+  Random random = TestRandom();
   for (size_t n = 0; n < 40; ++n) {
     GuardedArray<float> src(random.AwkwardFloats(n));
     GuardedArray<float> dst(n);
@@ -46,13 +43,13 @@ TEST(SquareRoot, IsTheRoundedRoot) {
     for (size_t i = 0; i < n; ++i) expected[i] = static_cast<float>(std::sqrt(double{src[i]}));
     ASSERT_EQ(mcvSqrtVectorf32(src.data(), dst.data(), static_cast<int32_t>(n)), 0);
     ASSERT_EQ(FirstDifference(dst.Values(), expected), -1);
-    for (size_t i = 0; i < n; ++i) ASSERT_TRUE(SameBits(mcvSqrtf32(src[i]), expected[i]));
+    for (size_t i = 0; i < n; ++i) ASSERT_TRUE(SameBitsOrNan(mcvSqrtf32(src[i]), expected[i]));
   }
 }
 
 TEST(InverseSquareRoot, IsTheEstimateAndTwoNewtonSteps) {
   EXPECT_FLOAT_EQ(mcvInvSqrtf32(4.0f), 0.4999978f);
-  RandomValues random(2);
+  Random random = TestRandom();
   for (size_t n = 0; n < 60; ++n) {
     // Negative values, infinities and not-a-numbers too: whatever the steps make of them.
     GuardedArray<float> src(random.AwkwardFloats(n));
@@ -61,7 +58,7 @@ TEST(InverseSquareRoot, IsTheEstimateAndTwoNewtonSteps) {
     for (size_t i = 0; i < n; ++i) expected[i] = ExpectedInverseSqrt(src[i]);
     ASSERT_EQ(mcvInvSqrtVectorf32(src.data(), dst.data(), static_cast<int32_t>(n)), 0);
     ASSERT_EQ(FirstDifference(dst.Values(), expected), -1);
-    for (size_t i = 0; i < n; ++i) ASSERT_TRUE(SameBits(mcvInvSqrtf32(src[i]), expected[i]));
+    for (size_t i = 0; i < n; ++i) ASSERT_TRUE(SameBitsOrNan(mcvInvSqrtf32(src[i]), expected[i]));
   }
 }
 
@@ -132,13 +129,14 @@ TEST(FastSquareRoot, FollowsTheRanges) {
     ASSERT_EQ(mcvFastSqrts32(v), ExpectedFastSqrt(v)) << v;
     ASSERT_EQ(mcvFastSqrts64(v), ExpectedFastSqrt(v)) << v;
   }
-  RandomValues random(3);
+  Random random = TestRandom();
   for (int power = 16; power < 63; ++power) {
     const int64_t start = int64_t{1} << power;
     for (int trial = 0; trial < 200; ++trial) {
-      const int64_t v = trial == 0   ? start
-                        : trial == 1 ? start - 1 + start
-                                     : random.Integer(start, start - 1 + start);
+      const int64_t v =
+          trial == 0   ? start
+          : trial == 1 ? start - 1 + start
+                       : start + static_cast<int64_t>(random.Word() % static_cast<uint64_t>(start));
       ASSERT_EQ(mcvFastSqrts64(v), ExpectedFastSqrt(v)) << v;
       if (power < 31) {
         ASSERT_EQ(mcvFastSqrts32(static_cast<int32_t>(v)), ExpectedFastSqrt(v)) << v;
@@ -148,4 +146,4 @@ TEST(FastSquareRoot, FollowsTheRanges) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

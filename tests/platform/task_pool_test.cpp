@@ -45,11 +45,10 @@ int __wrap_pthread_join(pthread_t thread, void** result) {
 // NOLINTEND(bugprone-reserved-identifier)
 }
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
 using ::testing::ElementsAre;
-using testing::FakeCpus;
 
 // Holds whoever passes until it is opened.
 class Gate {
@@ -481,4 +480,4 @@ TEST_F(TaskPoolTest, PoolMemoryFunctionsAreThoseOfTheMemoryLayer) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

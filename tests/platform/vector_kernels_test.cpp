@@ -7,14 +7,12 @@
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
-#include "platform/kernel_testing.h"
+#include "support/bits.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::FirstDifference;
-using testing::GuardedArray;
-using testing::RandomValues;
 
 template <typename T>
 double ExpectedFloatDistance(const std::vector<T>& a, const std::vector<T>& b) {
@@ -50,14 +48,14 @@ void CheckDistances(double (*kernel)(const T*, const T*, int32_t),
 template <typename T>
 void CheckRandomDistances(double (*kernel)(const T*, const T*, int32_t),
                           double (*expected)(const std::vector<T>&, const std::vector<T>&)) {
-  RandomValues random(sizeof(T));
+  Random random = TestRandom();
   for (size_t n = 0; n < 80; ++n) {
     CheckDistances<T>(kernel, expected, random.Integers<T>(n), random.Integers<T>(n));
   }
 }
 
 TEST(VectorDistance, FloatSumsInOrder) {
-  RandomValues random(1);
+  Random random = TestRandom();
   for (size_t n = 0; n < 80; ++n) {
     CheckDistances<float>(mcvVectorDiffNorm2f32, ExpectedFloatDistance<float>, random.Floats(n),
                           random.Floats(n));
@@ -116,7 +114,7 @@ TEST(VectorDistance, WithoutElementsIsZero) {
 }
 
 TEST(DotProduct, ReadsBytesAsUnsigned) {
-  RandomValues random(2);
+  Random random = TestRandom();
   for (size_t n = 0; n < 100; ++n) {
     GuardedArray<uint8_t> a(random.Integers<uint8_t>(n));
     GuardedArray<uint8_t> b(random.Integers<uint8_t>(n));
@@ -144,7 +142,7 @@ TEST(DotProduct, NullAndEmpty) {
 TEST(BitCount, CountsSetBits) {
   const uint8_t bytes[2] = {0xFF, 0x01};
   EXPECT_EQ(mcvBitCountu8(bytes, 2), 9);
-  RandomValues random(3);
+  Random random = TestRandom();
   for (size_t n = 0; n < 100; ++n) {
     GuardedArray<uint8_t> p(random.Integers<uint8_t>(n));
     int32_t expected = 0;
@@ -159,7 +157,7 @@ TEST(BitCount, CountsSetBits) {
 TEST(Division, DividesEachElement) {
   EXPECT_EQ(mcvDivf32(1.0f, 3.0f), 1.0f / 3.0f);
   EXPECT_EQ(mcvDivf32(-1.0f, 0.0f), -std::numeric_limits<float>::infinity());
-  RandomValues random(4);
+  Random random = TestRandom();
   for (size_t n = 0; n < 40; ++n) {
     GuardedArray<float> src(random.AwkwardFloats(n));
     GuardedArray<float> dst(n);
@@ -176,4 +174,4 @@ TEST(Division, DividesEachElement) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

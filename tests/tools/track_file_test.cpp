@@ -4,9 +4,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <random>
 #include <sstream>
 #include <string>
+
+#include "support/test_random.h"
 
 namespace n3ds::tool {
 namespace {
@@ -345,23 +346,23 @@ TEST(TrackFile, WhatIsWrittenReadsBack) {
 TEST(TrackFile, SurvivesRandomDamage) {
   const std::string whole =
       std::string(kHeader) + "\n" + Frame(0, Face(1, kTruth)) + "\n" + Frame(1, Face(1, kTruth));
-  std::mt19937 random(20240517);
+  auto random = n3ds::testing::TestRandom();
   const std::string alphabet = "0123456789-.e{}[]\",:nulltruefas \n\\\x01\xc3";
   int refused = 0;
   for (int round = 0; round < 2000; ++round) {
     std::string text = whole;
-    const int changes = 1 + static_cast<int>(random() % 4);
+    const int changes = 1 + random.Int(0, 3);
     for (int i = 0; i < changes; ++i) {
-      const std::size_t at = random() % text.size();
-      switch (random() % 3) {
+      const std::size_t at = random.Next() % text.size();
+      switch (random.Next() % 3) {
         case 0:
-          text[at] = alphabet[random() % alphabet.size()];
+          text[at] = alphabet[random.Next() % alphabet.size()];
           break;
         case 1:
-          text.erase(at, 1 + random() % 20);
+          text.erase(at, 1 + random.Next() % 20);
           break;
         default:
-          text.insert(at, 1, alphabet[random() % alphabet.size()]);
+          text.insert(at, 1, alphabet[random.Next() % alphabet.size()]);
       }
     }
     const std::string message = Refusal(text);

@@ -4,10 +4,9 @@
 
 #include <array>
 #include <cmath>
-#include <random>
 #include <vector>
 
-#include "math/math_testing.h"
+#include "support/random.h"
 
 namespace n3ds::testing {
 
@@ -67,13 +66,13 @@ struct PoseRange {
   float about_x, about_y, about_z, x, y, nearest, farthest;
 };
 
-inline Pose RandomPose(std::mt19937& random,
+inline Pose RandomPose(Random& random,
                        const PoseRange& range = {0.3f, 0.7f, 0.3f, 100, 80, 400, 1200}) {
   // One after the other: compilers differ in the order in which they evaluate arguments.
-  const auto within = [&](float bound) { return Uniform(random, -bound, bound); };
+  const auto within = [&](float bound) { return random.Float(-bound, bound); };
   const float about_x = within(range.about_x), about_y = within(range.about_y);
   const float about_z = within(range.about_z), x = within(range.x), y = within(range.y);
-  return MakePose(about_x, about_y, about_z, x, y, Uniform(random, range.nearest, range.farthest));
+  return MakePose(about_x, about_y, about_z, x, y, random.Float(range.nearest, range.farthest));
 }
 
 // The landmarks of a pose in double, rounded to float.

@@ -6,26 +6,10 @@
 #include <utility>
 #include <vector>
 
-#include "core/face_scene.h"
+#include "support/face_scene.h"
+#include "support/random.h"
 
 namespace n3ds::testing {
-
-// A memory pool of a given length, to run out of memory with.
-class SmallPool {
- public:
-  explicit SmallPool(size_t length)
-      : area_((length + 7) / 8), handle_(MMemMgrCreate(area_.data(), length)) {
-    fresh_ = GetMaxAllocMemSize(handle_);
-  }
-  MHandle handle() const { return handle_; }
-  // Whether everything taken was given back: a fresh pool is one free block.
-  bool Untouched() const { return GetMaxAllocMemSize(handle_) == fresh_; }
-
- private:
-  std::vector<uint64_t> area_;
-  MHandle handle_;
-  size_t fresh_;
-};
 
 // Arrays of exactly the model's sizes. The basis vectors are random, so that every coefficient can
 // be told from every other; nine tenths of the tensor are zero.
@@ -33,7 +17,7 @@ struct FitModel {
   std::vector<int16_t> mean, identity, expression, tensor;
 
   FitModel() {
-    Lcg random(20231);
+    Random random(20231);
     for (int i = 0; i < kShapeSize; ++i) {
       mean.push_back(static_cast<int16_t>(random.Int(-60 * 256, 60 * 256)));
     }
@@ -86,7 +70,7 @@ struct FitView {
   explicit FitView(uint64_t seed) {
     const RigidTransform pose = TransformOf({0.1, -0.05, 0.03, 0, 0, 0});
     for (const double r : pose.r) rotation.push_back(static_cast<float>(r));
-    Lcg random(seed);
+    Random random(seed);
     for (int i = 0; i < kFitLandmarkCount; ++i) {
       vertices.push_back(random.Int(0, kVertexCount - 1));
     }
@@ -150,14 +134,10 @@ inline float Along(const float* direction, const int16_t* vector) {
   return direction[0] * vector[0] + direction[1] * vector[1] + direction[2] * vector[2];
 }
 
-inline std::vector<float> RandomCoefficients(Lcg* random, int count, double size) {
+inline std::vector<float> RandomCoefficients(Random* random, int count, double size) {
   std::vector<float> values;
   for (int k = 0; k < count; ++k) values.push_back(static_cast<float>(random->In(-size, size)));
   return values;
-}
-
-inline bool SameBits(const std::vector<float>& a, const std::vector<float>& b) {
-  return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(float)) == 0;
 }
 
 }  // namespace n3ds::testing

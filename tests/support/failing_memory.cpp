@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: MIT
-#include "core/failing_memory.h"
+
+#include "support/failing_memory.h"
 
 #include <atomic>
 

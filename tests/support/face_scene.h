@@ -1,59 +1,23 @@
 // SPDX-License-Identifier: MIT
-// What the tests of the core share: the shipped face model read by their own code, landmarks of
-// model faces under known poses, and a core context with a model in it.
+// The shipped face model read by the tests' own code, and landmarks of model faces under known poses.
 //
 // Everything here uses only operations that give the same bits on every machine (no sines, no
 // library random distributions), so that golden values hold everywhere.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include <cmath>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
-#include <memory>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "core/model_tables.h"
-#include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/random.h"
 
 namespace n3ds::testing {
-
-// Knuth's 64-bit linear congruential generator; the upper bits are good enough for test data.
-class Lcg {
- public:
-  explicit Lcg(uint64_t seed) : state_(seed * 2862933555777941757u + 3037000493u) {}
-  uint32_t Next() {
-    state_ = state_ * 6364136223846793005u + 1442695040888963407u;
-    return static_cast<uint32_t>(state_ >> 33);
-  }
-  // A whole number in [low, high].
-  int32_t Int(int32_t low, int32_t high) {
-    const auto span = static_cast<uint64_t>(static_cast<int64_t>(high) - low + 1);
-    const uint64_t wide = (static_cast<uint64_t>(Next()) << 31) ^ Next();
-    return static_cast<int32_t>(low + static_cast<int64_t>(wide % span));
-  }
-  // In [0, 1).
-  double Unit() { return Next() / 2147483648.0; }
-  double In(double low, double high) { return low + (high - low) * Unit(); }
-
- private:
-  uint64_t state_;
-};
-
-// A seed of the running test's own: the order of the tests changes nothing.
-inline uint64_t TestSeed() {
-  const auto* info = ::testing::UnitTest::GetInstance()->current_test_info();
-  uint64_t hash = 14695981039346656037u;
-  for (const char c : std::string(info->test_suite_name()) + "." + info->name()) {
-    hash = (hash ^ static_cast<unsigned char>(c)) * 1099511628211u;
-  }
-  return hash;
-}
 
 inline std::vector<uint8_t> ReadBytes(const std::string& path) {
   std::vector<uint8_t> bytes;
@@ -205,7 +169,8 @@ inline void Project(const RigidTransform& pose, const Vec3& p, int width, int he
 // `noise` pixels.
 inline std::vector<int32_t> DetectLandmarks(const std::vector<double>& shape,
                                             const HeadPlace& place, int width, int height,
-                                            int count = 101, int noise = 0, Lcg* random = nullptr) {
+                                            int count = 101, int noise = 0,
+                                            Random* random = nullptr) {
   std::vector<int32_t> landmarks;
   const RigidTransform pose = TransformOf(place);
   for (const Vec3& p : LandmarkPoints(shape, count)) {
@@ -265,7 +230,7 @@ class Person {
   }
 
  private:
-  Lcg random_;
+  Random random_;
   std::vector<double> identity_;
   double phase_[7] = {};
   HeadPlace home_;
@@ -292,66 +257,6 @@ inline NSVL_OFFSCREEN ImageOf(int32_t width, int32_t height) {
   image.width = width;
   image.height = height;
   return image;
-}
-
-// A core context, released at the end of its scope.
-class Core {
- public:
-  explicit Core(MHandle memory = nullptr) { EXPECT_EQ(N3DS_Init(memory, &handle_), N3DS_OK); }
-  ~Core() { EXPECT_EQ(N3DS_UnInit(handle_), N3DS_OK); }
-  Core(const Core&) = delete;
-  Core& operator=(const Core&) = delete;
-
-  // With the shipped model.
-  static std::unique_ptr<Core> Ready(MHandle memory = nullptr) {
-    auto core = std::make_unique<Core>(memory);
-    EXPECT_EQ(N3DS_LoadFaceHouse(core->handle(), ModelBytes().data(), ModelBytes().size()),
-              N3DS_OK);
-    return core;
-  }
-  void* handle() const { return handle_; }
-  TrackingContext& context() const { return *ContextOf(handle_); }
-
- private:
-  void* handle_ = nullptr;
-};
-
-// The landmark records of a frame, each face's points in an allocation of exactly its size. The
-// points are copies: workers smooth them in place.
-class FaceRecords {
- public:
-  explicit FaceRecords(const std::vector<std::vector<int32_t>>& faces) {
-    for (const auto& face : faces) {
-      points_.emplace_back(new int32_t[face.size()]);
-      std::copy(face.begin(), face.end(), points_.back().get());
-      records_.push_back({points_.back().get(), static_cast<uint32_t>(face.size() / 2)});
-    }
-  }
-  N3DS_LANDMARK* get() { return records_.data(); }
-  N3DS_LANDMARK& operator[](size_t k) { return records_[k]; }
-  int32_t count() const { return static_cast<int32_t>(records_.size()); }
-  std::vector<int32_t> points(size_t k) const {
-    return {records_[k].points, records_[k].points + 2 * static_cast<size_t>(records_[k].count)};
-  }
-
- private:
-  std::vector<std::unique_ptr<int32_t[]>> points_;
-  std::vector<N3DS_LANDMARK> records_;
-};
-
-// The bits of floats, for comparisons in which -0 and 0 differ and NaN equals itself.
-template <typename Floats>
-std::vector<uint32_t> Bits(const Floats& floats, size_t count) {
-  std::vector<uint32_t> bits(count);
-  for (size_t i = 0; i < count; i++) std::memcpy(&bits[i], &floats[i], sizeof(float));
-  return bits;
-}
-inline std::vector<uint32_t> Bits(const std::vector<float>& floats) {
-  return Bits(floats, floats.size());
-}
-template <size_t kCount>
-std::vector<uint32_t> Bits(const float (&floats)[kCount]) {
-  return Bits(static_cast<const float*>(floats), kCount);
 }
 
 }  // namespace n3ds::testing
