@@ -9,39 +9,15 @@
 #include "core/face_matching.h"
 #include "core/pose_fitting.h"
 #include "core/pose_rounds.h"
-#include "synthetic_face.h"
+#include "support/face_scene.h"
 #include "tracked_faces.h"
 
 namespace {
 
-constexpr int32_t kWidth = 1280;
-constexpr int32_t kHeight = 720;
-constexpr int kFrames = 120;
-
-const std::vector<uint8_t>& Model() {
-  static const std::vector<uint8_t> model = n3ds::ReadModelFile(N3DS_DATA_DIR "/face_model.bin");
-  return model;
-}
-
-std::vector<std::vector<__tag_point>> Frames(int face_count) {
-  const n3ds::SyntheticFaces faces(Model(), kWidth, kHeight);
-  std::vector<std::vector<__tag_point>> frames(kFrames);
-  for (int i = 0; i < kFrames; i++) faces.Frame(i, face_count, &frames[static_cast<size_t>(i)]);
-  return frames;
-}
-
-std::vector<float> MeanShape() {
-  n3ds::TrackingContext* context = nullptr;
-  void* core = nullptr;
-  N3DS_Init(nullptr, &core);
-  N3DS_LoadFaceHouse(core, Model().data(), Model().size());
-  context = n3ds::ContextOf(core);
-  std::vector<float> shape(n3ds::kShapeSize);
-  for (size_t i = 0; i < shape.size(); i++)
-    shape[i] = static_cast<float>(context->meanShape[i]) / 256.0f;
-  N3DS_UnInit(core);
-  return shape;
-}
+using n3ds::bench::FramesWithFaces;
+using n3ds::bench::kTrackHeight;
+using n3ds::bench::kTrackWidth;
+using n3ds::testing::ModelBytes;
 
 // An engine with a picture to process and room for its results.
 struct Host {
@@ -52,10 +28,10 @@ struct Host {
   float landmarks_3d[N3DS_MAX_FACES][3 * 101];
 
   Host() {
-    Norvale_3DSticker_InitializeEx(engine, Model().data(), static_cast<uint32_t>(Model().size()), 0,
-                                   0);
-    image.width = kWidth;
-    image.height = kHeight;
+    Norvale_3DSticker_InitializeEx(engine, ModelBytes().data(),
+                                   static_cast<uint32_t>(ModelBytes().size()), 0, 0);
+    image.width = kTrackWidth;
+    image.height = kTrackHeight;
     for (int k = 0; k < N3DS_MAX_FACES; k++) matrices.faces[k].landmarks3D = landmarks_3d[k];
   }
   ~Host() { Norvale_3DSticker_DestroyEngine(engine); }
@@ -71,13 +47,13 @@ void WithWorkers(benchmark::internal::Benchmark* bench) {
 
 void RigidFrame(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));
-  auto frames = Frames(static_cast<int>(face_count));
+  auto frames = FramesWithFaces(static_cast<int>(face_count));
   Host host;
   size_t frame = 0;
   for (auto _ : state) {
     const MRESULT result =
-        Norvale_3DSticker_Process(host.engine, &host.image, face_count, 101, frames[frame].data(),
-                                  nullptr, nullptr, &host.matrices);
+        Norvale_3DSticker_Process(host.engine, &host.image, face_count, 101,
+                                  frames[frame].points.data(), nullptr, nullptr, &host.matrices);
     if (result != N3DS_OK) state.SkipWithError("frame failed");
     frame = (frame + 1) % frames.size();
   }
@@ -86,9 +62,8 @@ BENCHMARK(RigidFrame)->Apply(WithWorkers);
 
 // Faces of the example tracks, with expressions and noise.
 void MaskFrame(benchmark::State& state) {
-  static_assert(kWidth == n3ds::bench::kTrackWidth && kHeight == n3ds::bench::kTrackHeight);
   const auto face_count = static_cast<uint32_t>(state.range(0));
-  auto frames = n3ds::bench::FramesWithFaces(static_cast<int>(face_count));
+  auto frames = FramesWithFaces(static_cast<int>(face_count));
   Host host;
   size_t frame = 0;
   for (auto _ : state) {
@@ -123,12 +98,12 @@ BENCHMARK(Pool)->Apply(WithWorkers);
 
 void Matching(benchmark::State& state) {
   const auto face_count = static_cast<uint32_t>(state.range(0));
-  const auto frames = Frames(static_cast<int>(face_count));
+  const auto frames = FramesWithFaces(static_cast<int>(face_count));
   n3ds::FaceAssignment assignment;
   size_t frame = 1;
   for (auto _ : state) {
-    n3ds::AssignFaces(&frames[frame][0].x, face_count, &frames[frame - 1][0].x, face_count, 101,
-                      &assignment);
+    n3ds::AssignFaces(&frames[frame].points[0].x, face_count, &frames[frame - 1].points[0].x,
+                      face_count, 101, &assignment);
     benchmark::DoNotOptimize(assignment);
     frame = frame % (frames.size() - 1) + 1;
   }
@@ -137,14 +112,14 @@ BENCHMARK(Matching)->Arg(1)->Arg(3)->Arg(5)->Unit(benchmark::kMicrosecond);
 
 // A tracked face: every fit starts from the pose of the frame before.
 struct TrackedFace {
-  std::vector<float> shape = MeanShape();
-  std::vector<std::vector<__tag_point>> frames = Frames(1);
-  float camera[9] = {(kWidth + kHeight) / 2.0f,
+  std::vector<float> shape = n3ds::testing::MeanShapeFloats();
+  std::vector<n3ds::bench::TrackedFrame> frames = FramesWithFaces(1);
+  float camera[9] = {(kTrackWidth + kTrackHeight) / 2.0f,
                      0,
-                     kWidth / 2.0f,
+                     kTrackWidth / 2.0f,
                      0,
-                     (kWidth + kHeight) / 2.0f,
-                     kHeight / 2.0f,
+                     (kTrackWidth + kTrackHeight) / 2.0f,
+                     kTrackHeight / 2.0f,
                      0,
                      0,
                      1};
@@ -156,10 +131,12 @@ struct TrackedFace {
     rounds.StartNewFace();
     for (int i = 0; i < 4; i++) {
       Fit(0);
-      rounds.UpdateContour(&frames[0][0].x);
+      rounds.UpdateContour(&frames[0].points[0].x);
     }
   }
-  bool Fit(size_t frame) { return rounds.Fit(&frames[frame][0].x, contour, {0, 1.0f, 1.0f, 1.0f}); }
+  bool Fit(size_t frame) {
+    return rounds.Fit(&frames[frame].points[0].x, contour, {0, 1.0f, 1.0f, 1.0f});
+  }
 };
 
 void PoseFit(benchmark::State& state) {
@@ -174,7 +151,7 @@ BENCHMARK(PoseFit)->Unit(benchmark::kMicrosecond);
 
 void Contour(benchmark::State& state) {
   TrackedFace face;
-  for (auto _ : state) face.rounds.UpdateContour(&face.frames[0][0].x);
+  for (auto _ : state) face.rounds.UpdateContour(&face.frames[0].points[0].x);
 }
 BENCHMARK(Contour)->Unit(benchmark::kMicrosecond);
 

@@ -7,12 +7,12 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
-#include <random>
 #include <vector>
 
 #include "eigen_product.h"
 #include "norvale_3d_sticker_core.h"
 #include "platform/matrix_product.h"
+#include "support/random.h"
 
 namespace {
 
@@ -27,10 +27,9 @@ struct Operands {
         A(static_cast<size_t>(m) * k),
         B(static_cast<size_t>(k) * n),
         C(static_cast<size_t>(m) * n) {
-    std::mt19937 engine(7);
-    std::uniform_real_distribution<float> value(-1.0f, 1.0f);
-    for (float& a : A) a = value(engine);
-    for (float& b : B) b = value(engine);
+    n3ds::testing::Random random(7);
+    for (float& a : A) a = random.Float(-1.0f, 1.0f);
+    for (float& b : B) b = random.Float(-1.0f, 1.0f);
   }
 
   double Error() const {

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "math/pose_residuals.h"
-#include "math/pose_scene.h"
+#include "support/pose_scene.h"
 
 namespace n3ds::bench {
 
@@ -27,22 +27,22 @@ struct ProblemSet {
   std::vector<Problem> problems;
 
   ProblemSet() {
-    std::mt19937 random(11);
+    testing::Random random(11);
     for (int i = 0; i < 256; ++i) {
       Problem p;
       float angles[3], place[3];
-      for (float& a : angles) a = testing::Uniform(random, -0.4f, 0.4f);
-      for (float& v : place) v = testing::Uniform(random, -80, 80);
+      for (float& a : angles) a = random.Float(-0.4f, 0.4f);
+      for (float& v : place) v = random.Float(-80, 80);
       const auto pose = [&] {
         return testing::MakePose(angles[0], angles[1], angles[2], place[0], place[1],
                                  600 + place[2]);
       };
       p.truth = pose();
       p.landmarks = testing::Project(model, camera, p.truth);
-      for (float& v : p.landmarks) v = std::floor(v + 0.5f * testing::Normal(random) + 0.5f);
+      for (float& v : p.landmarks) v = std::floor(v + 0.5f * random.Normal() + 0.5f);
       // What a head does from one frame to the next.
-      for (float& a : angles) a += testing::Uniform(random, -2, 2) * kDegree;
-      for (float& v : place) v += testing::Uniform(random, -5, 5);
+      for (float& a : angles) a += random.Float(-2, 2) * kDegree;
+      for (float& v : place) v += random.Float(-5, 5);
       p.start = pose();
       problems.push_back(p);
     }

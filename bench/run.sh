@@ -1,27 +1,27 @@
-#!/bin/sh
+#!/usr/bin/env bash
 # SPDX-License-Identifier: MIT
 # Runs every benchmark program and writes one CSV of medians each; without program names also the
 # comparison of the tracking with solvePnP, a text.
 # usage: bench/run.sh [OUTPUT_DIRECTORY] [PROGRAM_NAME...]      default: build/bench/results, all
-set -eu
+set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 out=${1:-$root/build/bench/results}
-[ $# -gt 0 ] && shift
-programs=$root/build/bench/bench/programs
+names=("${@:2}")
+programs=$root/build/bench/programs
 if [ ! -d "$programs" ]; then
   echo "no programs in $programs: cmake --preset bench && cmake --build --preset bench" >&2
   exit 1
 fi
 mkdir -p "$out"
-peer=$root/build/bench/bench/solve_pnp_peer
-if [ $# -eq 0 ]; then
-  set -- $(ls "$programs")
+peer=$root/build/bench/solve_pnp_peer
+if [ "${#names[@]}" -eq 0 ]; then
+  for program in "$programs"/*; do names+=("$(basename "$program")"); done
   if [ -x "$peer" ]; then
     echo solve_pnp_peer >&2
     "$peer" "$root"/examples/tracks/synthetic_*.track.jsonl >"$out/solve_pnp_peer.txt"
   fi
 fi
-for name in "$@"; do
+for name in "${names[@]}"; do
   echo "$name" >&2
   # Repetitions of different benchmarks take turns, so that a busy minute of the machine falls on
   # all of them alike.

@@ -6,9 +6,9 @@
 #include <cstring>
 #include <vector>
 
-#include "core/face_scene.h"
 #include "core/rigid_shape_refinement.h"
 #include "core/shape_fitting.h"
+#include "support/face_scene.h"
 
 namespace n3ds::bench {
 namespace {

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <stdexcept>
 
-#include "synthetic_face.h"
+#include "support/face_scene.h"
 #include "tracks/track_file.h"
 
 namespace n3ds::bench {
@@ -38,7 +38,7 @@ TrackedFrame InOrder(tool::TrackFrame frame) {
 }  // namespace
 
 std::vector<TrackedFrame> FramesWithFaces(int face_count) {
-  const tool::Track track = tool::ReadTrackFile(std::string(N3DS_EXAMPLE_DIR "/tracks/") +
+  const tool::Track track = tool::ReadTrackFile(std::string(N3DS_SOURCE_DIR "/examples/tracks/") +
                                                 TrackOf(face_count) + ".track.jsonl");
   std::vector<TrackedFrame> frames;
   for (const tool::TrackFrame& frame : track.frames) {
@@ -52,7 +52,7 @@ std::vector<TrackedFrame> FramesWithFaces(int face_count) {
 }
 
 TrackedFaces::TrackedFaces(int face_count) : face_count_(face_count) {
-  static const std::vector<uint8_t> model = ReadModelFile(N3DS_DATA_DIR "/face_model.bin");
+  const std::vector<uint8_t>& model = testing::ModelBytes();
   if (N3DS_Init(nullptr, &core_) != N3DS_OK ||
       N3DS_LoadFaceHouse(core_, model.data(), model.size()) != N3DS_OK) {
     throw std::runtime_error("no core");

@@ -47,7 +47,6 @@ packages_of() {
       echo 'libceres-dev           # peer of the pose solver'
       echo 'libopencv-calib3d-dev  # peer of the tracking, solvePnP'
       echo 'libopencv-imgproc-dev  # peer of the mask warp and blend'
-      echo 'libgtest-dev           # the scenes of the tests, which benchmarks share'
       echo 'nlohmann-json3-dev     # benchmarks read landmark tracks'
       ;;
     *)

@@ -13,7 +13,7 @@
 #include "norvale_3d_sticker_core.h"
 #include "support/test_random.h"
 
-namespace n3ds::testing {
+namespace n3ds {
 
 // In the point's own namespace, where matchers look for them.
 static bool operator==(const HullPoint& a, const HullPoint& b) {
@@ -275,4 +275,4 @@ TEST(ConvexHull, IsTheTrueHullWhereverEveryCornerTurnsClearly) {
 
 }  // namespace
 }  // namespace testing
-}  // namespace n3ds::testing
+}  // namespace n3ds
