@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 // Dense linear systems: LU factorisation without pivoting (Doolittle), square systems, and least
 // squares through the normal equations.
+#include <algorithm>
 #include <cmath>
 #include <cstdio>
 
@@ -14,6 +15,13 @@ using n3ds::ScratchArray;
 // Absolute, whatever the size of the matrix: callers rely on it as the singularity test, so that a
 // system without enough evidence in it fails instead of giving wild values.
 constexpr double kMinPivot = 1e-6;
+
+// What is 0 or 1 in row i of L and U.
+void WriteFixedParts(size_t i, size_t n, float* L, float* U) {
+  std::fill_n(U + i * n, i, 0.0f);
+  L[i * n + i] = 1.0f;
+  std::fill_n(L + i * n + i + 1, n - i - 1, 0.0f);
+}
 
 // x from L U x = rhs. y is scratch of n floats.
 void SubstituteLU(const float* L, const float* U, size_t n, const float* rhs, float* y, float* x) {
@@ -51,24 +59,24 @@ MRESULT MatDecompLU(const float* A, int32_t n, float* L, float* U) {
     const float* a = A + i * size;
     float* l = L + i * size;
     float* u = U + i * size;
-    // The row of U first gathers the sums of L(i,k) U(k,j) over k, for the columns of both rows,
+    // The row of L first gathers the sums of L(i,k) U(k,j) over k, for the columns of both rows,
     // row of U by row of U; each sum still takes its terms in increasing k, as the definition does
     // that goes column by column.
-    for (size_t j = 0; j < size; ++j) u[j] = 0.0f;
+    std::fill_n(l, size, 0.0f);
     for (size_t k = 0; k < i; ++k) {
       const float* upper = U + k * size;
-      const float lower = (a[k] - u[k]) / upper[k];
+      const float lower = (a[k] - l[k]) / upper[k];
       l[k] = lower;
-      for (size_t j = k + 1; j < size; ++j) u[j] += lower * upper[j];
+      for (size_t j = k + 1; j < size; ++j) l[j] += lower * upper[j];
     }
-    for (size_t j = 0; j < i; ++j) u[j] = 0.0f;
-    for (size_t j = i; j < size; ++j) u[j] = a[j] - u[j];
-    l[i] = 1.0f;
-    for (size_t j = i + 1; j < size; ++j) l[j] = 0.0f;
+    u[i] = a[i] - l[i];
     if (std::fabs(static_cast<double>(u[i])) < kMinPivot) {
       std::puts("zero in LU");
+      for (size_t row = i; row < size; ++row) WriteFixedParts(row, size, L, U);
       return N3DS_NUMERICAL;
     }
+    for (size_t j = i + 1; j < size; ++j) u[j] = a[j] - l[j];
+    WriteFixedParts(i, size, L, U);
   }
   return N3DS_OK;
 }

@@ -141,6 +141,27 @@ TEST(MatDecompLUTest, LaterPivotBelowTheThresholdFailsAndPrints) {
   EXPECT_EQ(status, N3DS_NUMERICAL);
 }
 
+TEST(MatDecompLUTest, AFailureStopsAtThePivotWithTheFixedPartsWritten) {
+  auto random = MakeRandom();
+  const int n = 9;
+  for (int failing = 1; failing < n; ++failing) {
+    Vector A = RandomSquare(random, n);
+    // The same as the first row, so that every step is exact.
+    std::copy_n(A.begin(), n, A.begin() + failing * n);
+    Vector L(n * n, kUnwritten), U(n * n, kUnwritten), expected_L(L), expected_U(U);
+    ASSERT_FALSE(ReferenceLU(A, n, &expected_L, &expected_U));
+    MRESULT status = N3DS_OK;
+    PrintedBy([&] { status = MatDecompLU(A.data(), n, L.data(), U.data()); });
+    EXPECT_EQ(status, N3DS_NUMERICAL);
+    EXPECT_TRUE(SameBits(L, expected_L)) << "row " << failing;
+    EXPECT_TRUE(SameBits(U, expected_U)) << "row " << failing;
+    EXPECT_EQ(U[failing * n + failing], 0.0f);
+    if (failing + 1 < n) {
+      EXPECT_EQ(U[failing * n + failing + 1], kUnwritten);
+    }
+  }
+}
+
 TEST(MatDecompLUTest, PivotThatIsNotANumberIsNotTakenForZero) {
   const float A = std::nanf("");
   float L = 0, U = 0;
