@@ -418,7 +418,7 @@ MRESULT ComputeJacobianEtc(MHandle memory, float* J, float* JtJ, float* g, float
       pose == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  if (pointCount < 0 || paramCount < 0) return N3DS_BAD_VALUE;
+  if (pointCount < 0 || pointCount > n3ds::kMaxPoints || paramCount < 0) return N3DS_BAD_VALUE;
 
   const n3ds::PoseResiduals residuals({landmarks, modelPoints, pointCount, camera, contourWeight,
                                        rangeWeight, weightingMode, innerWeight, paramCount});

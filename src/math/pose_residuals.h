@@ -15,6 +15,9 @@ namespace n3ds {
 // always seven floats, also when fewer or more parameters are asked for.
 constexpr int32_t kPoseParameters = 7;
 
+// Beyond it the number of residuals, two per point, is no 32-bit integer.
+constexpr int32_t kMaxPoints = INT32_MAX / 2;
+
 // One fit's observations and weights; the arrays belong to the caller of the solver.
 struct PoseProblem {
   const float* landmarks;     // x, y per point, pixels

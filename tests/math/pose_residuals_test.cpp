@@ -567,6 +567,12 @@ TEST(ComputeJacobianEtcTest, MixOfNullAndSetOutputsComesFirstThenNullsThenSizes)
   }
 }
 
+TEST(ComputeJacobianEtcTest, CountsWithoutAnIntegerForTheirRowsAreRefused) {
+  Arguments a;
+  EXPECT_EQ(a.Call(0, 1 << 30), N3DS_BAD_VALUE);
+  EXPECT_EQ(a.Call(0, INT32_MAX), N3DS_BAD_VALUE);
+}
+
 TEST(ComputeJacobianEtcTest, NoPointsGiveZeroNormalEquations) {
   Arguments a;
   EXPECT_EQ(a.Call(0, 0), N3DS_OK);
