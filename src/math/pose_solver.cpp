@@ -12,18 +12,13 @@
 namespace n3ds {
 namespace {
 
-// First damping, relative to the largest diagonal element of J^T J.
-constexpr float kDampingSeed = 0.001f;
+// Relative to the largest diagonal element of J^T J.
+constexpr float kInitialDamping = 0.001f;
 // The gradient's largest element that counts as zero.
 constexpr float kGradientTolerance = 1e-5f;
 // A step this small relative to the pose ends the solve; also keeps the bound above 0 for pose 0.
 constexpr float kStepTolerance = 1e-5f;
 constexpr int32_t kMaxIterations = 20;
-// The damping shrinks by at most this after a step that did what the linear model promised.
-constexpr float kSmallestShrink = 0.333f;
-constexpr double kSmallestShrinkLimit = 0.333;
-// Growth of the damping after the first rejected step; it doubles with each further one.
-constexpr int32_t kFirstGrowth = 2;
 
 float LargestDiagonal(const float* matrix, size_t n) {
   float largest = 0.0f;
@@ -43,6 +38,35 @@ float Norm(const float* vector, size_t n) {
   return std::sqrt(sum);
 }
 
+// The damping of the normal equations, by the gain ratio of the last step.
+class Damping {
+ public:
+  explicit Damping(float value) : value_(value) {}
+
+  float value() const { return value_; }
+  // After a rejected step; the growth doubles from one rejection to the next.
+  void Raise() {
+    value_ *= static_cast<float>(growth_);
+    growth_ *= 2;
+  }
+  // After an accepted step: up to twice as much when it gained little, a third when it gained all
+  // that the linear model promised.
+  void Lower(float ratio) {
+    // The limit is the double 0.333, which a float exceeds exactly when it is not below 0.333f.
+    constexpr float kSmallestShrink = 0.333f;
+    static_assert(static_cast<double>(kSmallestShrink) > 0.333);
+    const float t = 2.0f * ratio - 1.0f;
+    value_ *= std::max(kSmallestShrink, 1.0f - t * t * t);
+    growth_ = kFirstGrowth;
+  }
+
+ private:
+  static constexpr int32_t kFirstGrowth = 2;
+
+  float value_;
+  int32_t growth_ = kFirstGrowth;
+};
+
 // What the step did to the sum of squares over what the linear model promised; the factors 1/2 of
 // both are left out.
 float GainRatio(const float* r, const float* r_new, size_t rows, const float* h, const float* g,
@@ -52,6 +76,22 @@ float GainRatio(const float* r, const float* r_new, size_t rows, const float* h,
   float promised = 0.0f;
   for (size_t j = 0; j < n; ++j) promised += h[j] * (damping * h[j] + g[j]);
   return gain / promised;
+}
+
+// h from (JtJ + damping I) h = -g. A is scratch of JtJ's size.
+//
+// The stored gradient changes its sign here on every pass, also after a rejected step. The pass that
+// follows a rejection therefore steps uphill; it is usually rejected too, so one failure raises the
+// damping twice.
+MRESULT FindStep(MHandle memory, const float* JtJ, float damping, int32_t parameters, float* A,
+                 float* g, float* h) {
+  const size_t n = static_cast<size_t>(parameters);
+  std::copy_n(JtJ, n * n, A);
+  for (size_t j = 0; j < n; ++j) {
+    A[j * n + j] += damping;
+    g[j] = -g[j];
+  }
+  return SolveLinearAxb(memory, A, parameters, parameters, h, g);
 }
 
 }  // namespace
@@ -69,7 +109,7 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
   const ScratchArray<float> residuals_a(memory, rows);
   const ScratchArray<float> residuals_b(memory, rows);
   const ScratchArray<float> g(memory, n);
-  // Not the usual code: hosts know a memory too small for the problem itself as a missing argument.
+  // This code, not N3DS_NO_MEMORY, is the documented result of the first allocations.
   if (!J || !JtJ || !residuals_a || !residuals_b || !g) return N3DS_NULL_ARGUMENT;
   const ScratchArray<float> A(memory, n * n);
   const ScratchArray<float> h(memory, n);
@@ -89,24 +129,15 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
     if (!Jt) return N3DS_NO_MEMORY;
     residuals.FormNormalEquations(r, J.get(), Jt.get(), JtJ.get(), g.get());
   }
-  float damping = kDampingSeed * LargestDiagonal(JtJ.get(), n);
+  Damping damping(kInitialDamping * LargestDiagonal(JtJ.get(), n));
   if (LargestMagnitude(g.get(), n) <= kGradientTolerance) {
     summary->stop = PoseSolverStop::kGradient;
     return N3DS_OK;
   }
 
-  int32_t growth = kFirstGrowth;
   while (summary->iterations < kMaxIterations) {
     ++summary->iterations;
-    std::copy_n(JtJ.get(), n * n, A.get());
-    for (size_t j = 0; j < n; ++j) {
-      A[j * n + j] += damping;
-      // The stored gradient changes its sign on every pass, also after a rejected step. The pass
-      // that follows a rejection therefore steps uphill; as a rule it is rejected in its turn, and
-      // so a failing linear model raises the damping twice. Thresholds elsewhere are tuned to this.
-      g[j] = -g[j];
-    }
-    status = SolveLinearAxb(memory, A.get(), parameters, parameters, h.get(), g.get());
+    status = FindStep(memory, JtJ.get(), damping.value(), parameters, A.get(), g.get(), h.get());
     if (status != N3DS_OK) return status;
     if (Norm(h.get(), n) <= kStepTolerance * (Norm(pose, n) + kStepTolerance)) {
       summary->stop = PoseSolverStop::kStep;
@@ -121,10 +152,9 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
     status = residuals.Linearise(trial.get(), r_trial, J.get(), Jt.get());
     if (status != N3DS_OK) return status;
 
-    const float ratio = GainRatio(r, r_trial, rows, h.get(), g.get(), damping, n);
-    if (!(ratio > 0.0f)) {  // also when it is not a number
-      damping *= static_cast<float>(growth);
-      growth *= 2;
+    const float ratio = GainRatio(r, r_trial, rows, h.get(), g.get(), damping.value(), n);
+    if (!(ratio > 0.0f)) {  // also when it is NaN
+      damping.Raise();
       continue;
     }
 
@@ -137,10 +167,7 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
       summary->stop = PoseSolverStop::kGradient;
       return N3DS_OK;
     }
-    const float t = 2.0f * ratio - 1.0f;
-    const float shrink = 1.0f - t * t * t;
-    damping *= static_cast<double>(shrink) > kSmallestShrinkLimit ? shrink : kSmallestShrink;
-    growth = kFirstGrowth;
+    damping.Lower(ratio);
   }
   summary->stop = PoseSolverStop::kIterationLimit;
   return N3DS_OK;
@@ -154,7 +181,7 @@ MRESULT SolveByLM(MHandle memory, const float* landmarks, const float* modelPoin
   if (landmarks == nullptr || modelPoints == nullptr || camera == nullptr || pose == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  if (pointCount < 0 || paramCount < 0) return N3DS_BAD_VALUE;
+  if (pointCount < 0 || pointCount > n3ds::kMaxPoints || paramCount < 0) return N3DS_BAD_VALUE;
   n3ds::PoseSolverSummary summary;
   return n3ds::SolvePose(memory,
                          {landmarks, modelPoints, pointCount, camera, contourWeight, rangeWeight,

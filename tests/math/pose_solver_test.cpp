@@ -344,6 +344,26 @@ TEST(SolveByLMTest, PoseThatIsNotANumberEndsWithoutHarm) {
   EXPECT_EQ(pose[6], 600);
 }
 
+// Every gain is then NaN, which is no gain.
+TEST(SolveByLMTest, LandmarkThatIsNotANumberLeavesThePose) {
+  PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
+  c.landmarks[2 * 30] = std::nanf("");
+  const Pose start = MakePose(0.1f, 0.1f, 0, 5, 0, 620);
+  Pose pose = start;
+  PrintedBy([&] { EXPECT_EQ(Solve(c, &pose), N3DS_OK); });
+  EXPECT_EQ(pose, start);
+}
+
+TEST(SolveByLMTest, CountsWithoutAnIntegerForTheirRowsAreRefused) {
+  const PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
+  Pose pose = MakePose(0, 0, 0, 0, 0, 600);
+  for (const int32_t count : {1 << 30, INT32_MAX}) {
+    EXPECT_EQ(SolveByLM(nullptr, c.landmarks.data(), c.model.data(), count, c.camera.data(),
+                        pose.data(), 1, 1, 0, 1, 7),
+              N3DS_BAD_VALUE);
+  }
+}
+
 TEST(SolveByLMTest, NullPointersComeBeforeSizes) {
   const PoseCase c = ExactCase(MakePose(0, 0, 0, 0, 0, 600));
   Pose pose = MakePose(0, 0, 0, 0, 0, 600);
