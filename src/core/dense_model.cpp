@@ -86,8 +86,6 @@ void BuildBlock(const FaceMeshTask& task, ptrdiff_t first, int count) {
   }
 }
 
-using FaceProducts = int16_t[kProductCount];
-
 void FillTasks(TrackingContext* context, int32_t face, const int16_t* products,
                FaceMeshTask* tasks) {
   for (int quarter = 0; quarter < kMeshTasksPerFace; quarter++) {
