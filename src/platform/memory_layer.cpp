@@ -77,6 +77,7 @@ BlockHeader* FindBlock(MHandle pool, const void* payload, BlockHeader** previous
 MHandle MMemMgrCreate(void* area, size_t length) {
   if (area == nullptr) return nullptr;
   const uintptr_t address = reinterpret_cast<uintptr_t>(area);
+  if (length > UINTPTR_MAX - address) return nullptr;  // would end beyond the last address
   const size_t skipped = static_cast<size_t>(-address & 7);
   if (length < skipped) return nullptr;
   const uint64_t usable = (length - skipped) & ~uint64_t{7};

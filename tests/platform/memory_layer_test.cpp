@@ -106,6 +106,16 @@ TEST(MemoryPool, AreaOfThirtyTwoBytesOrLessIsRefused) {
   EXPECT_EQ(MMemMgrCreate(nullptr, 1000), nullptr);
 }
 
+TEST(MemoryPool, AreaBeyondTheLastAddressIsRefused) {
+  alignas(8) unsigned char area[128];
+  std::memset(area, 0x5A, sizeof(area));
+  const size_t to_the_end = SIZE_MAX - reinterpret_cast<uintptr_t>(area + 64);
+  EXPECT_EQ(MMemMgrCreate(area + 64, SIZE_MAX), nullptr);
+  EXPECT_EQ(MMemMgrCreate(area + 64, SIZE_MAX - 7), nullptr);
+  EXPECT_EQ(MMemMgrCreate(area + 64, to_the_end + 1), nullptr);
+  for (const unsigned char byte : area) EXPECT_EQ(byte, 0x5A);
+}
+
 TEST(MemoryPool, SmallestPoolHoldsOneBlockOfEight) {
   Pool pool(8);
   EXPECT_EQ(GetMaxAllocMemSize(pool.handle()), 8u);
