@@ -87,8 +87,9 @@ int32_t mcvDetectMotion(const mcvMotionRecord* previous, const mcvMotionRecord* 
   }
   for (int i = 0; i < 3; ++i) {
     const mcvMotionPlane& size = *current->plane[i];
-    if (size.width < 1 || size.height < 1 || !SameSize(*previous->plane[i], size) ||
-        !SameSize(*next->plane[i], size) || !SameSize(*result->plane[i], size)) {
+    if (size.width < 1 || size.height < 1 || size.width > INT64_MAX / size.height ||
+        !SameSize(*previous->plane[i], size) || !SameSize(*next->plane[i], size) ||
+        !SameSize(*result->plane[i], size)) {
       return N3DS_BAD_VALUE;
     }
   }

@@ -105,7 +105,8 @@ int32_t mcvBitCountu8(const uint8_t* p, uint32_t n) {
     bits += static_cast<uint64_t>(__builtin_popcountll(word));
   }
   for (; i < n; ++i) bits += static_cast<uint64_t>(__builtin_popcount(p[i]));
-  return static_cast<int32_t>(bits);
+  // From 2^28 bytes on the count may exceed the result's range.
+  return bits <= INT32_MAX ? static_cast<int32_t>(bits) : N3DS_BAD_VALUE;
 }
 
 float mcvDivf32(float a, float b) { return a / b; }

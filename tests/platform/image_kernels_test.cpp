@@ -273,5 +273,12 @@ TEST_F(DetectMotion, SizesThatDifferOrAreEmpty) {
   }
 }
 
+TEST_F(DetectMotion, SizesWhoseProductOverflowsAreRefused) {
+  for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
+    picture->plane(2).width = picture->plane(2).height = int64_t{1} << 40;
+  }
+  EXPECT_EQ(Run(), -2);
+}
+
 }  // namespace
 }  // namespace n3ds::testing

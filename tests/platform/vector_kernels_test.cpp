@@ -1,9 +1,12 @@
 // SPDX-License-Identifier: MIT
 #include <gtest/gtest.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <bitset>
 #include <cmath>
 #include <cstdint>
+#include <cstring>
 #include <vector>
 
 #include "norvale_3d_sticker_core.h"
@@ -152,6 +155,25 @@ TEST(BitCount, CountsSetBits) {
   EXPECT_EQ(mcvBitCountu8(nullptr, 5), -1);
   EXPECT_EQ(mcvBitCountu8(nullptr, 0), -1);
   EXPECT_EQ(mcvBitCountu8(bytes, 0), 0);
+}
+
+// 2^28 bytes of ones, as one piece of memory mapped many times over.
+TEST(BitCount, CountBeyondTheResultsRangeIsRefused) {
+  constexpr size_t kPiece = size_t{1} << 22, kLength = size_t{1} << 28;
+  const int file = memfd_create("ones", 0);
+  ASSERT_EQ(ftruncate(file, kPiece), 0);
+  void* area = mmap(nullptr, kLength, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  ASSERT_NE(area, MAP_FAILED);
+  uint8_t* bytes = static_cast<uint8_t*>(area);
+  for (size_t at = 0; at < kLength; at += kPiece) {
+    ASSERT_NE(mmap(bytes + at, kPiece, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_FIXED, file, 0),
+              MAP_FAILED);
+  }
+  std::memset(bytes, 0xFF, kPiece);
+  EXPECT_EQ(mcvBitCountu8(bytes, static_cast<uint32_t>(kLength)), N3DS_BAD_VALUE);
+  EXPECT_EQ(mcvBitCountu8(bytes, static_cast<uint32_t>(kLength) - 1), INT32_MAX - 7);
+  munmap(area, kLength);
+  close(file);
 }
 
 TEST(Division, DividesEachElement) {
