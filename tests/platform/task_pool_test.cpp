@@ -406,6 +406,18 @@ TEST_F(TaskPoolTest, ShutdownDropsPendingTasks) {
   EXPECT_EQ(counter, 0);
 }
 
+// The task's effect may shut the pool down before the call that added it is back.
+TEST_F(TaskPoolTest, TaskMaySetOffTheShutdown) {
+  for (int round = 0; round < 100; ++round) {
+    TaskPool* pool = MakePool(1);
+    std::atomic<int> ran{0};
+    std::thread adder([&] { EXPECT_EQ(mcvAddTask(pool, Increment, &ran), 0); });
+    AwaitCount(ran, 1);
+    EXPECT_EQ(mcvParallelUninit(pool), 0);
+    adder.join();
+  }
+}
+
 TEST_F(TaskPoolTest, NullArguments) {
   std::atomic<int> counter = 0;
   EXPECT_EQ(mcvAddTask(nullptr, Increment, &counter), -1);
