@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: MIT
-// The exported mask warp: checks, the output picture, and the tracked face's pose and camera.
+// The exported mask warp: checks, the output image, and the tracked face's pose and camera.
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <limits>
@@ -13,8 +14,8 @@ namespace {
 
 using n3ds::TrackingContext;
 
-// Gives an output without a buffer the given size and a buffer of the core's memory. The
-// descriptor's fields stand even when there is no memory.
+// Gives an output without a buffer the given size and a buffer of the core's memory. The fields are
+// set even if the allocation fails.
 bool SetUpOutput(MHandle memory, int32_t width, int32_t height, NSVL_OFFSCREEN* output) {
   output->pixelFormat = N3DS_FORMAT_BGRA32;
   output->width = width;
@@ -29,10 +30,19 @@ bool SetUpOutput(MHandle memory, int32_t width, int32_t height, NSVL_OFFSCREEN* 
   return output->plane[0] != nullptr;
 }
 
-void Clear(const NSVL_OFFSCREEN& picture) {
-  if (picture.pitch[0] <= 0 || picture.height <= 0) return;
-  MMemSet(picture.plane[0], 0,
-          static_cast<size_t>(picture.pitch[0]) * static_cast<size_t>(picture.height));
+void Clear(const NSVL_OFFSCREEN& image) {
+  if (image.pitch[0] <= 0 || image.height <= 0) return;
+  MMemSet(image.plane[0], 0,
+          static_cast<size_t>(image.pitch[0]) * static_cast<size_t>(image.height));
+}
+
+bool HasPixels(const NSVL_OFFSCREEN& image) {
+  return image.plane[0] != nullptr && image.width > 0 && image.height > 0 && image.pitch[0] >= 0;
+}
+
+bool IndicesExist(const uint16_t* triangles) {
+  return std::all_of(triangles, triangles + 3 * N3DS_TRIANGLE_COUNT,
+                     [](uint16_t vertex) { return vertex < N3DS_VERTEX_COUNT; });
 }
 
 }  // namespace
@@ -40,25 +50,28 @@ void Clear(const NSVL_OFFSCREEN& picture) {
 MRESULT N3DS_WarpFaceMask(void* core, const N3DS_2D_TEXTURE_MASK* mask, NSVL_OFFSCREEN* output,
                           const N3DS_3D_MODEL* model, int32_t width, int32_t height,
                           int32_t faceIndex) {
-  if (core == nullptr || mask == nullptr || output == nullptr || model == nullptr ||
-      model->vertices == nullptr || model->triangles == nullptr) {
+  if (core == nullptr || mask == nullptr || output == nullptr || model == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
   const auto& context = *static_cast<const TrackingContext*>(core);
-  const NSVL_OFFSCREEN& picture = mask->image;
-  if (width <= 0 || height <= 0 || picture.plane[0] == nullptr || picture.width <= 0 ||
-      picture.height <= 0 || picture.pixelFormat != N3DS_FORMAT_BGRA32 || faceIndex < 0 ||
+  if (width <= 0 || height <= 0 || !HasPixels(mask->image) ||
+      mask->image.pixelFormat != N3DS_FORMAT_BGRA32 || faceIndex < 0 ||
       static_cast<uint32_t>(faceIndex) >= context.faceNum) {
     return N3DS_BAD_VALUE;
+  }
+  // A face that was never fitted has no mesh and no pose, and its image stays clear.
+  const bool tracked = context.trackFlag[faceIndex] != 0;
+  if (tracked) {
+    if (model->vertices == nullptr || model->triangles == nullptr) return N3DS_NULL_ARGUMENT;
+    if (!IndicesExist(model->triangles)) return N3DS_BAD_VALUE;
   }
 
   if (output->plane[0] == nullptr && !SetUpOutput(context.memory, width, height, output)) {
     return N3DS_NO_MEMORY;
   }
   Clear(*output);
+  if (!tracked) return N3DS_OK;
 
-  // A face that was never fitted has no pose, and its picture stays clear.
-  if (context.trackFlag[faceIndex] == 0) return N3DS_OK;
   const float* p = context.maskPose[faceIndex];
   const float R[9] = {p[0], p[1], p[2], p[4], p[5], p[6], p[8], p[9], p[10]};
   const float t[3] = {p[3], p[7], p[11]};

@@ -34,31 +34,31 @@ struct LinearMap {
   float x, y, constant;
 };
 
-// The common case of the saturating conversion without its detour over double.
-int32_t Truncate(float value) {
-  constexpr float kTwoTo31 = 2147483648.0f;
-  return std::fabs(value) < kTwoTo31 ? static_cast<int32_t>(value) : TruncateToInt32(value);
-}
+int32_t RoundToPixel(float coordinate) { return TruncateToInt32(coordinate + 0.5f); }
 
-int32_t RoundToPixel(float coordinate) { return Truncate(coordinate + 0.5f); }
-
-// Keeps a coordinate in 0..last. Not-a-number stays, and is rejected by the caller.
+// Keeps a coordinate in 0..last. NaN passes through and is rejected by the caller.
 float ClampToImage(float value, float last) {
   if (value < 0.0f) value = 0.0f;
   if (value > last) value = last;
   return value;
 }
 
-// Position in the texture picture along one axis of `size` pixels. The clamp lands a pixel further
-// in than the test demands, so that a coordinate at the border still has neighbours to blend with.
+// Position in the texture along one axis of `size` pixels. At the border it is pixel size - 3, from
+// where rounding does not take it beyond the last pixel that has a neighbour to blend with.
 float ClampToTexture(float value, int32_t size) {
+  const int32_t limit = size - 2;
   if (value < 0.0f) value = 0.0f;
-  if (value >= static_cast<float>(size - 2)) value = static_cast<float>(size - 3);
+  if (value >= static_cast<float>(limit)) value = static_cast<float>(limit - 1);
   return value;
 }
 
-// A point in the camera plane has no image; it is drawn in the corner of the picture.
-Point Project(const float* vertex, const float* K, const float* R, const float* t) {
+struct Camera {
+  const float *K, *R, *t;  // 3 x 3, 3 x 3, 3
+};
+
+// A point in the camera plane has no projection; it is drawn in the corner of the image.
+Point Project(const float* vertex, const Camera& camera) {
+  const auto [K, R, t] = camera;
   const float x = vertex[0], y = vertex[1], z = vertex[2];
   const float zc = R[6] * x + R[7] * y + R[8] * z + t[2];
   if (zc == 0.0f) return {0.0f, 0.0f};
@@ -73,8 +73,8 @@ F32x4 Mix(F32x4 left, F32x4 right, float t) {
 }
 
 // The texture's colour at a position between pixel (itx, ity) and its neighbours to the right and
-// below, blended. The weights leave 0..1 only in textures of two pixels, where the result is
-// clamped.
+// below, blended. The weights lie outside 0..1 where the position is below 0 by less than a pixel,
+// since truncation then gives pixel 0; the result is clamped.
 void SampleTexture(const NSVL_OFFSCREEN& texture, int32_t itx, int32_t ity, float fx, float fy,
                    uint8_t* pixel) {
   const uint8_t* upper =
@@ -125,8 +125,8 @@ class TriangleFiller {
       const float b0 = 1.0f - b1 - b2;
       const float tx = b0 * corners_[0].x + b1 * corners_[1].x + b2 * corners_[2].x;
       const float ty = b0 * corners_[0].y + b1 * corners_[1].y + b2 * corners_[2].y;
-      const int32_t itx = Truncate(tx);
-      const int32_t ity = Truncate(ty);
+      const int32_t itx = TruncateToInt32(tx);
+      const int32_t ity = TruncateToInt32(ty);
       if (itx < 0 || itx >= columns || ity < 0 || ity >= rows) continue;
       SampleTexture(texture_, itx, ity, tx - static_cast<float>(itx), ty - static_cast<float>(ity),
                     row + int64_t{4} * x);
@@ -145,7 +145,7 @@ bool IsAbove(const Corner& a, const Corner& b) {
   return a.iy < b.iy || (a.iy == b.iy && a.ix < b.ix);
 }
 
-// Top, middle, bottom. On a tie the order of before stays, as far as the two exchanges allow.
+// Top, middle, bottom. Ties keep their order as far as two exchanges allow; this is no stable sort.
 void SortFromTop(Corner* corners) {
   int smallest = 0;
   if (IsAbove(corners[1], corners[smallest])) smallest = 1;
@@ -202,20 +202,50 @@ void ScanConvert(Corner* corners, const TriangleFiller& filler, int32_t height) 
   }
 }
 
-// Where the mask's texture vertices are: the caller's layout, or the engine's own, whose table runs
-// v downwards.
+// Where the mask's texture vertices are: the caller's layout, or the engine's own, whose table has v
+// pointing down.
 struct TextureLayout {
   const float* coordinates;
   const uint16_t* triangles;
   bool v_down;
 
-  Point At(uint16_t vertex, const NSVL_OFFSCREEN& texture) const {
-    const float u = coordinates[2 * vertex];
-    const float v = v_down ? 1.0f - coordinates[2 * vertex + 1] : coordinates[2 * vertex + 1];
-    return {ClampToTexture(static_cast<float>(texture.width) * u, texture.width),
-            ClampToTexture((1.0f - v) * static_cast<float>(texture.height), texture.height)};
+  // The corners of triangle k in the texture; false for vertices that do not exist.
+  bool Place(int k, const NSVL_OFFSCREEN& texture, Point* corners) const {
+    for (int c = 0; c < 3; ++c) {
+      const uint16_t vertex = triangles[3 * k + c];
+      if (vertex >= N3DS_VERTEX_COUNT) return false;
+      const float u = coordinates[2 * vertex];
+      const float v = v_down ? 1.0f - coordinates[2 * vertex + 1] : coordinates[2 * vertex + 1];
+      corners[c] = {
+          ClampToTexture(static_cast<float>(texture.width) * u, texture.width),
+          ClampToTexture((1.0f - v) * static_cast<float>(texture.height), texture.height)};
+    }
+    return true;
   }
 };
+
+// The corners of the mesh's triangle k in an image of that size; false for NaN and for an image
+// without pixels.
+bool PlaceInImage(const N3DS_3D_MODEL& model, int k, const Camera& camera, float width,
+                  float height, Point* corners) {
+  for (int c = 0; c < 3; ++c) {
+    const Point p = Project(model.vertices + 3 * model.triangles[3 * k + c], camera);
+    const Point clamped = {ClampToImage(p.x, width - 1.0f), ClampToImage(p.y, height - 1.0f)};
+    if (!(clamped.x >= 0.0f && clamped.x < width && clamped.y >= 0.0f && clamped.y < height)) {
+      return false;
+    }
+    corners[c] = clamped;
+  }
+  return true;
+}
+
+// Twice the signed area.
+float DoubleArea(const Point* corners) {
+  const auto [x0, y0] = corners[0];
+  const auto [x1, y1] = corners[1];
+  const auto [x2, y2] = corners[2];
+  return x1 * y0 - x1 * y2 + x0 * y2 - x0 * y1 + x2 * y1 - x2 * y0;
+}
 
 }  // namespace
 
@@ -229,34 +259,16 @@ MRESULT WarpFace(const N3DS_3D_MODEL& model, const N3DS_2D_TEXTURE_MASK& mask, c
     layout = {mask.texCoords, mask.triangles, false};
   }
 
-  // The buffer is pitch x height bytes, whatever width its descriptor claims.
+  // The buffer has pitch x height bytes, whatever width its descriptor claims.
   const int32_t row_pixels = std::min(output.width, output.pitch[0] / 4);
   const float width = static_cast<float>(output.width);
   const float height = static_cast<float>(output.height);
   for (int k = 0; k < N3DS_TRIANGLE_COUNT; ++k) {
-    const uint16_t* texture_triangle = layout.triangles + 3 * k;
-    const uint16_t* mesh_triangle = model.triangles + 3 * k;
     Point texture_points[3];
     Point image[3];
-    bool drawable = true;
-    for (int c = 0; c < 3; ++c) {
-      if (texture_triangle[c] >= N3DS_VERTEX_COUNT) {
-        drawable = false;
-        break;
-      }
-      texture_points[c] = layout.At(texture_triangle[c], mask.image);
-      const Point p = Project(model.vertices + 3 * mesh_triangle[c], K, R, t);
-      image[c] = {ClampToImage(p.x, width - 1.0f), ClampToImage(p.y, height - 1.0f)};
-      // False only for not-a-number and for an output without pixels.
-      drawable = drawable && image[c].x >= 0.0f && image[c].x < width && image[c].y >= 0.0f &&
-                 image[c].y < height;
-    }
-    if (!drawable) continue;
-
-    const auto [x0, y0] = image[0];
-    const auto [x1, y1] = image[1];
-    const auto [x2, y2] = image[2];
-    const float area = x1 * y0 - x1 * y2 + x0 * y2 - x0 * y1 + x2 * y1 - x2 * y0;
+    if (!layout.Place(k, mask.image, texture_points)) continue;
+    if (!PlaceInImage(model, k, {K, R, t}, width, height, image)) continue;
+    const float area = DoubleArea(image);
     if (area == 0.0f) continue;
 
     Corner corners[3];

@@ -168,7 +168,7 @@ TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
 
   NSVL_OFFSCREEN& picture = *texture_.get();
   const NSVL_OFFSCREEN good = picture;
-  for (int field = 0; field < 6; ++field) {
+  for (int field = 0; field < 7; ++field) {
     picture = good;
     if (field == 0) picture.plane[0] = nullptr;
     if (field == 1) picture.width = 0;
@@ -176,6 +176,7 @@ TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
     if (field == 3) picture.width = -32;
     if (field == 4) picture.pixelFormat = N3DS_FORMAT_BGR24;
     if (field == 5) picture.pixelFormat = N3DS_FORMAT_NV21;
+    if (field == 6) picture.pitch[0] *= -1;
     EXPECT_EQ(Warp(output.get()), N3DS_BAD_VALUE) << field;
     NSVL_OFFSCREEN none = {};
     EXPECT_EQ(Warp(&none), N3DS_BAD_VALUE) << field;
@@ -183,6 +184,26 @@ TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
     EXPECT_EQ(none.width, 0);
   }
   EXPECT_EQ(output.Bytes(), before);
+}
+
+TEST_F(MaskWarp, RejectsMeshIndicesWithoutAVertex) {
+  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  output.Fill(7);
+  const auto before = output.Bytes();
+  const N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
+  const N3DS_3D_MODEL model = scene_.Model();
+  std::vector<uint16_t> triangles(model.triangles, model.triangles + 3 * N3DS_TRIANGLE_COUNT);
+  const N3DS_3D_MODEL other = {model.vertices, model.vertexCount, triangles.data(),
+                               model.triangleCount};
+  for (const size_t index : {size_t{0}, triangles.size() - 1}) {
+    triangles[index] = N3DS_VERTEX_COUNT;
+    EXPECT_EQ(N3DS_WarpFaceMask(context_.get(), &mask, output.get(), &other, 16, 12, 0),
+              N3DS_BAD_VALUE);
+    EXPECT_EQ(output.Bytes(), before);
+    triangles[index] = N3DS_VERTEX_COUNT - 1;
+    EXPECT_EQ(N3DS_WarpFaceMask(context_.get(), &mask, output.get(), &other, 16, 12, 0), N3DS_OK);
+    output.Fill(7);
+  }
 }
 
 TEST_F(MaskWarp, WrongTextureCountsGiveAClearOutput) {
@@ -203,6 +224,17 @@ TEST_F(MaskWarp, FaceThatWasNeverTrackedGivesAClearOutput) {
   EXPECT_TRUE(AllZero(output.Bytes()));
   EXPECT_EQ(Warp(output.get(), 16, 12, 0), N3DS_OK);
   EXPECT_FALSE(AllZero(output.Bytes()));
+}
+
+// Its model record may not have been filled.
+TEST_F(MaskWarp, FaceThatWasNeverTrackedNeedsNoMesh) {
+  context_->trackFlag[0] = 0;
+  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  output.Fill(7);
+  const N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
+  const N3DS_3D_MODEL empty = {};
+  EXPECT_EQ(N3DS_WarpFaceMask(context_.get(), &mask, output.get(), &empty, 16, 12, 0), N3DS_OK);
+  EXPECT_TRUE(AllZero(output.Bytes()));
 }
 
 TEST_F(MaskWarp, EachFaceIsDrawnWithItsOwnPose) {
