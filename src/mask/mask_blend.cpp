@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Compositing of a mask picture over a camera image: the mask takes on the light of the image
+// Compositing of a mask image over a camera image: the mask takes on the light of the image
 // underneath, then is blended in by its alpha in 8-bit fixed point.
 //
 // The work is done on strips of pixels, one array per channel: loops of a fixed length over plain
@@ -25,8 +25,8 @@ struct MaskStrip {
   int32_t alpha[kStripPixels];
 };
 
-uint8_t* Row(const NSVL_OFFSCREEN& picture, int plane, int64_t y) {
-  return picture.plane[plane] + y * picture.pitch[plane];
+uint8_t* Row(const NSVL_OFFSCREEN& image, int plane, int64_t y) {
+  return image.plane[plane] + y * image.pitch[plane];
 }
 
 bool IsTransparent(const uint8_t* mask, int pixels) {
@@ -55,8 +55,8 @@ void BlendChannel(const double* shading, const int32_t* alpha, const int32_t* ma
 }
 
 // The shading factor says how much of the mask's colour is left over a pixel: half over black, all
-// over white. Red weighs most on purpose: these are not the converters' luma weights. A transparent
-// pixel keeps its colour.
+// over white. These are not the converters' luma weights: red, skin's strongest channel, weighs most.
+// A transparent pixel keeps its colour.
 void Blend(const MaskStrip& mask, ColourStrip* image) {
   double shading[kStripPixels];
   for (int i = 0; i < kStripPixels; ++i) {
@@ -99,6 +99,9 @@ void BlendBgr24(const NSVL_OFFSCREEN& image, const NSVL_OFFSCREEN& mask,
   }
 }
 
+// The part of a length that whole blocks of two cover.
+int32_t WholeBlocks(int32_t length) { return length - length % 2; }
+
 // Two rows of pixels with the chroma they share, one value per pixel.
 struct YuvStrip {
   int32_t y[2][kStripPixels], u[2][kStripPixels], v[2][kStripPixels];
@@ -123,6 +126,31 @@ void BlendYuvRow(const MaskStrip& mask, int row, YuvStrip* strip) {
   }
 }
 
+void LoadYuvRow(const uint8_t* luma, const uint8_t* chroma, int pixels, int row, YuvStrip* strip) {
+  for (int i = 0; i < pixels; ++i) {
+    strip->y[row][i] = luma[i];
+    strip->v[row][i] = chroma[i & ~1];
+    strip->u[row][i] = chroma[i | 1];
+  }
+}
+
+// Writes the 2 x 2 blocks that one of the mask's two rows touches.
+void StoreTouchedBlocks(const YuvStrip& strip, const uint8_t* const* mask, int pixels,
+                        uint8_t* const* luma, uint8_t* chroma) {
+  for (int i = 0; i < pixels; i += 2) {
+    if (IsTransparent(mask[0] + 4 * i, 2) && IsTransparent(mask[1] + 4 * i, 2)) continue;
+    int32_t u = 0, v = 0;
+    for (int row = 0; row < 2; ++row) {
+      luma[row][i] = static_cast<uint8_t>(strip.y[row][i]);
+      luma[row][i + 1] = static_cast<uint8_t>(strip.y[row][i + 1]);
+      u += strip.u[row][i] + strip.u[row][i + 1];
+      v += strip.v[row][i] + strip.v[row][i + 1];
+    }
+    chroma[i] = static_cast<uint8_t>(v >> 2);
+    chroma[i + 1] = static_cast<uint8_t>(u >> 2);
+  }
+}
+
 // Blocks that the mask leaves alone are not written: the output holds the image there already. In a
 // block that it touches, transparent pixels make the trip through colour and back like the others,
 // because the block's chroma is averaged anew. A trailing odd row or column belongs to no block.
@@ -130,44 +158,29 @@ void BlendNv21(const NSVL_OFFSCREEN& image, const NSVL_OFFSCREEN& mask,
                const NSVL_OFFSCREEN& output) {
   MaskStrip mask_strips[2] = {};
   YuvStrip strip = {};
-  const int64_t width = image.width - image.width % 2;
+  const int64_t width = WholeBlocks(image.width);
   for (int64_t y = 0; y + 1 < image.height; y += 2) {
     for (int64_t x = 0; x < width; x += kStripPixels) {
       const int pixels = static_cast<int>(std::min<int64_t>(kStripPixels, width - x));
       const uint8_t* over[2] = {Row(mask, 0, y) + 4 * x, Row(mask, 0, y + 1) + 4 * x};
       if (IsTransparent(over[0], pixels) && IsTransparent(over[1], pixels)) continue;
-
-      const uint8_t* in_chroma = Row(image, 1, y / 2) + x;
       for (int row = 0; row < 2; ++row) {
-        const uint8_t* in = Row(image, 0, y + row) + x;
-        for (int i = 0; i < pixels; ++i) {
-          strip.y[row][i] = in[i];
-          strip.v[row][i] = in_chroma[i & ~1];
-          strip.u[row][i] = in_chroma[i | 1];
-        }
+        LoadYuvRow(Row(image, 0, y + row) + x, Row(image, 1, y / 2) + x, pixels, row, &strip);
         Load(over[row], pixels, &mask_strips[row]);
         BlendYuvRow(mask_strips[row], row, &strip);
       }
-
       uint8_t* out[2] = {Row(output, 0, y) + x, Row(output, 0, y + 1) + x};
-      uint8_t* out_chroma = Row(output, 1, y / 2) + x;
-      for (int i = 0; i < pixels; i += 2) {
-        if ((over[0][4 * i + 3] | over[0][4 * i + 7] | over[1][4 * i + 3] | over[1][4 * i + 7]) ==
-            0) {
-          continue;
-        }
-        int32_t u = 0, v = 0;
-        for (int row = 0; row < 2; ++row) {
-          out[row][i] = static_cast<uint8_t>(strip.y[row][i]);
-          out[row][i + 1] = static_cast<uint8_t>(strip.y[row][i + 1]);
-          u += strip.u[row][i] + strip.u[row][i + 1];
-          v += strip.v[row][i] + strip.v[row][i + 1];
-        }
-        out_chroma[i] = static_cast<uint8_t>(v >> 2);
-        out_chroma[i + 1] = static_cast<uint8_t>(u >> 2);
-      }
+      StoreTouchedBlocks(strip, over, pixels, out, Row(output, 1, y / 2) + x);
     }
   }
+}
+
+// Whether the image has that many planes of at least that size.
+bool Covers(const NSVL_OFFSCREEN& image, int planes, int32_t width, int32_t height) {
+  for (int plane = 0; plane < planes; ++plane) {
+    if (image.plane[plane] == nullptr || image.pitch[plane] < 0) return false;
+  }
+  return image.width >= width && image.height >= height;
 }
 
 }  // namespace
@@ -175,17 +188,23 @@ void BlendNv21(const NSVL_OFFSCREEN& image, const NSVL_OFFSCREEN& mask,
 MRESULT N3DS_BlendFaceMask(void* /*core*/, NSVL_OFFSCREEN* image, NSVL_OFFSCREEN* mask,
                            NSVL_OFFSCREEN* output) {
   if (image == nullptr || mask == nullptr || output == nullptr) return N3DS_NULL_ARGUMENT;
-  if (mask->pixelFormat != N3DS_FORMAT_BGRA32 || image->pixelFormat != output->pixelFormat) {
+  const bool packed = image->pixelFormat == N3DS_FORMAT_BGR24;
+  if (mask->pixelFormat != N3DS_FORMAT_BGRA32 || image->pixelFormat != output->pixelFormat ||
+      (!packed && image->pixelFormat != N3DS_FORMAT_NV21)) {
     return N3DS_BAD_VALUE;
   }
-  switch (image->pixelFormat) {
-    case N3DS_FORMAT_BGR24:
-      BlendBgr24(*image, *mask, *output);
-      return N3DS_OK;
-    case N3DS_FORMAT_NV21:
-      BlendNv21(*image, *mask, *output);
-      return N3DS_OK;
-    default:
-      return N3DS_BAD_VALUE;
+  const int32_t width = packed ? mask->width : WholeBlocks(image->width);
+  const int32_t height = packed ? mask->height : WholeBlocks(image->height);
+  if (width < 1 || height < 1) return N3DS_OK;
+  const int planes = packed ? 1 : 2;
+  if (!Covers(*mask, 1, width, height) || !Covers(*image, planes, width, height) ||
+      !Covers(*output, planes, width, height)) {
+    return N3DS_BAD_VALUE;
   }
+  if (packed) {
+    BlendBgr24(*image, *mask, *output);
+  } else {
+    BlendNv21(*image, *mask, *output);
+  }
+  return N3DS_OK;
 }

@@ -178,6 +178,44 @@ TEST(MaskBlend, RejectsImageFormatsItDoesNotKnow) {
   }
 }
 
+TEST_P(BlendFormats, RejectsImagesThatAreTooSmallOrHaveNoPixelsBeforeWriting) {
+  TestPicture image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGRA32, 4, 4), output(GetParam(), 4, 4);
+  mask.Fill(255);
+  output.Fill(9);
+  const auto before = output.Bytes();
+  const bool packed = GetParam() == N3DS_FORMAT_BGR24;
+  TestPicture* const pictures[] = {&image, &mask, &output};
+  for (TestPicture* picture : pictures) {
+    const NSVL_OFFSCREEN good = picture->descriptor();
+    const int planes = packed || picture == &mask ? 1 : 2;
+    for (int field = 0; field < 2 + 2 * planes; ++field) {
+      *picture->get() = good;
+      if (field == 0) picture->get()->width = 2;
+      if (field == 1) picture->get()->height = 2;
+      if (field == 2 || field == 4) picture->get()->plane[field / 2 - 1] = nullptr;
+      if (field == 3 || field == 5) picture->get()->pitch[field / 2 - 1] *= -1;
+      // The packed format walks the mask's rectangle, the other one the image's.
+      const bool walked = packed ? picture == &mask : picture == &image;
+      const MRESULT expected = walked && field < 2 ? N3DS_OK : N3DS_BAD_VALUE;
+      const MRESULT status = N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get());
+      EXPECT_EQ(status, expected) << "field " << field;
+      if (status == N3DS_OK) {
+        output.Fill(9);
+      } else {
+        EXPECT_EQ(output.Bytes(), before) << "field " << field;
+      }
+    }
+    *picture->get() = good;
+  }
+  EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
+}
+
+// A trailing odd row and column need no mask.
+TEST(MaskBlend, TwoPlaneMaskMayEndWithTheLastBlock) {
+  TestPicture image(N3DS_FORMAT_NV21, 5, 5), mask(N3DS_FORMAT_BGRA32, 4, 4);
+  EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
+}
+
 TEST(MaskBlend, EmptyPicturesAreNoError) {
   for (const uint32_t format : {N3DS_FORMAT_BGR24, N3DS_FORMAT_NV21}) {
     for (const int size : {0, -1, INT32_MIN}) {
