@@ -16,6 +16,7 @@ from PIL import Image, ImageDraw
 
 import measurements
 import tables
+from arithmetic import length
 from shipped import Model
 from triangulate import boundary_edges, boundary_rings, edge_owners
 
@@ -62,7 +63,7 @@ def skull(rings=24, sectors=40):
             triangles += [(a, c, b), (b, c, d)]
     points, triangles = np.array(points), np.array(triangles)
     a, b, c = (points[triangles[:, k]] for k in range(3))
-    return points, triangles[np.linalg.norm(np.cross(b - a, c - a), axis=1) > 1e-6]
+    return points, triangles[length(np.cross(b - a, c - a)) > 1e-6]
 
 
 def occluder(model):

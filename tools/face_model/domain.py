@@ -5,7 +5,7 @@ Flat coordinates are millimetres, x right and y up, the half at image left (x <=
 coordinates run from 0 to 1 with v downwards.
 """
 
-from dataclasses import dataclass
+from dataclasses import dataclass, field
 
 import numpy as np
 from scipy.optimize import brentq
@@ -14,15 +14,21 @@ from scipy.spatial import ConvexHull
 import nostril
 import outline
 import sample_mesh
+from arithmetic import length, settled
+from measurements import Measurements
 
+# The rectangle of the texture that the face fills, and its middle line. Fixed: masks are painted
+# in this layout, so a new model has to keep it.
 U_MIDDLE = 0.499946
 U_LEFT, U_RIGHT = 0.016646, 0.983246
 V_TOP, V_BOTTOM = 0.002930, 0.997054
 # The texture keeps the middle of the face in true proportion and narrows the sides.
 MIDDLE_PROPORTION = 0.95
 
-# Texture places of the first three vertices; vertex 1 has exactly the neighbours 0, 2, 4 and 3.
+# Texture places of the vertices 0 to 2, before the ear at image left, fixed as the layout is;
+# vertex 1 has exactly the neighbours 0, 2, 4 and 3.
 FIRST_TEXTURE = {0: (0.069524, 0.281949), 1: (0.081158, 0.319456), 2: (0.038178, 0.318155)}
+# Flat places (mm) of the two others, below them and inside the border.
 PATCH_FLAT = {3: (-102.5, 17.0), 4: (-110.0, 4.0)}
 
 BORDER_CENTRE_Y = -30.0
@@ -43,16 +49,22 @@ class Layout:
         self.v_scale = (V_BOTTOM - V_TOP) / (self.top - self.bottom)
         self.u_scale = MIDDLE_PROPORTION * self.v_scale
         half = U_MIDDLE - U_LEFT
-        self.u_bend = (self.u_scale * -self.left - half) / (-self.left) ** 3
+        self.u_bend = (self.u_scale * -self.left - half) / self._cube(-self.left)
 
-    def u_of(self, x):
-        return U_MIDDLE + self.u_scale * x - self.u_bend * x**3
+    @staticmethod
+    def _cube(x):
+        return x * x * x  # the same bits everywhere, unlike x**3
 
-    def texture(self, flat):
+    def u_of(self, x: np.ndarray) -> np.ndarray:
+        return U_MIDDLE + self.u_scale * x - self.u_bend * self._cube(x)
+
+    def texture(self, flat: np.ndarray) -> np.ndarray:
+        """Texture coordinates (n, 2) of flat places (n, 2)."""
         return np.column_stack([
             self.u_of(flat[:, 0]), V_TOP + (self.top - flat[:, 1]) * self.v_scale])
 
-    def flat(self, u, v):
+    def flat(self, u: float, v: float) -> np.ndarray:
+        """The flat place of one pair of texture coordinates."""
         x = brentq(lambda t: self.u_of(t) - u, self.left, -self.left, xtol=1e-12)
         return np.array([x, self.top - (v - V_TOP) / self.v_scale])
 
@@ -69,32 +81,40 @@ class Domain:
     eye: np.ndarray  # dense closed polyline through the lid rims
     mouth: np.ndarray  # dense polyline from the middle of the upper rim to that of the lower
     nostril: np.ndarray  # places round the rim of the nostril
-    patch: dict  # flat places of the vertices 0 to 4
+    patch: dict[int, np.ndarray]  # flat places of the vertices 0 to 4
 
     points: np.ndarray  # the measured points of the half in space
-    rows: list = None  # (row, flat place) of the vertices for outlines
-    stops: list = None  # (row, length along the border) where those rows meet it
+    # Vertices for outlines as (row, flat place), and where their rows meet the border as (row,
+    # length along it).
+    rows: list[tuple] = field(default_factory=list)
+    stops: list[tuple] = field(default_factory=list)
 
-    def place(self, point):
+    def place(self, point: int) -> np.ndarray:
+        """Flat place of a measured point of the half."""
         return self.flat[np.flatnonzero(self.ids == point)[0]]
 
-    def flat_of(self, places):
-        """Flat places of places in space: on the nearest of the coarse triangles."""
+    def flat_of(self, places: np.ndarray) -> np.ndarray:
+        """Flat places (n, 2) of places in space (n, 3): on the nearest of the coarse triangles."""
         out = []
         a, b, c = (self.points[self.triangles[:, k]] for k in range(3))
         for p in places:
-            near = np.argsort(np.linalg.norm((a + b + c) / 3.0 - p, axis=1), kind="stable")[:12]
+            near = np.argsort(length((a + b + c) / 3.0 - p), kind="stable")[:12]
             best = None
             for t in near:
                 edges = np.column_stack([b[t] - a[t], c[t] - a[t]])
                 w = np.linalg.lstsq(edges, p - a[t], rcond=None)[0]
                 outside = max(0.0, -w[0], -w[1], w.sum() - 1.0)
-                distance = np.linalg.norm(edges @ w - (p - a[t])) + 30.0 * outside
+                distance = length(edges @ w - (p - a[t])) + 30.0 * outside
                 if best is None or distance < best[0] - 1e-9:
                     w = np.array([1.0 - w.sum(), *w])
                     best = (distance, w @ self.flat[self.triangles[t]])
             out.append(best[1])
-        return np.round(out, 4)
+        return settled(out, 4, doubt=1e-10)
+
+
+def _mix(a, b, low, high, t):
+    """Between a at t = low and b at t = high."""
+    return ((high - t) * a + (t - low) * b) / (high - low)
 
 
 def _catmull_rom(points, closed, steps=24):
@@ -108,14 +128,12 @@ def _catmull_rom(points, closed, steps=24):
     out = []
     for k in range(n if closed else n - 1):
         p = padded[k:k + 4]
-        lengths = np.linalg.norm(np.diff(p, axis=0), axis=1)
-        knots = np.concatenate([[0.0], np.cumsum(np.sqrt(lengths))])
+        knots = np.concatenate([[0.0], np.cumsum(np.sqrt(length(np.diff(p, axis=0))))])
         for s in range(steps):
             t = knots[1] + (knots[2] - knots[1]) * s / steps
-            mix = lambda a, b, low, high: ((high - t) * a + (t - low) * b) / (high - low)
-            first = [mix(p[i], p[i + 1], knots[i], knots[i + 1]) for i in range(3)]
-            second = [mix(first[i], first[i + 1], knots[i], knots[i + 2]) for i in range(2)]
-            out.append(mix(second[0], second[1], knots[1], knots[2]))
+            first = [_mix(p[i], p[i + 1], knots[i], knots[i + 1], t) for i in range(3)]
+            second = [_mix(first[i], first[i + 1], knots[i], knots[i + 2], t) for i in range(2)]
+            out.append(_mix(second[0], second[1], knots[1], knots[2], t))
     if not closed:
         out.append(points[-1])
     return np.array(out)
@@ -127,7 +145,7 @@ def _border(flat):
     outer = ConvexHull(both).vertices
     outer = np.sort(outer[outer < len(flat)])
     offset = flat[outer] - [0.0, BORDER_CENTRE_Y]
-    radius = np.linalg.norm(offset, axis=1)
+    radius = length(offset)
     angle = np.arctan2(-offset[:, 0], offset[:, 1])  # 0 up, growing to image left
     basis = np.cos(np.outer(angle, np.arange(BORDER_TERMS)))
     ridge = np.diag(0.002 * np.arange(BORDER_TERMS) ** 3)
@@ -138,16 +156,15 @@ def _border(flat):
     r = np.cos(np.outer(turn, np.arange(BORDER_TERMS))) @ fitted
     line = [0.0, BORDER_CENTRE_Y] + np.column_stack([-r * np.sin(turn), r * np.cos(turn)])
     line[[0, -1], 0] = 0.0
-    return line, np.min(basis @ fitted - radius)
+    return settled(line, 4, doubt=1e-10), np.min(basis @ fitted - radius)
 
 
-def build(data):
+def build(data: Measurements) -> Domain:
     ids, flat, triangles = sample_mesh.build(data)
-    flat = np.round(flat, 4)  # later steps do not depend on the last bits of the solver
+    flat = settled(flat, 4, doubt=1e-9)  # what follows hangs on every bit
     border, clearance = _border(flat)
     if clearance < 0.5:
         raise ValueError(f"the border comes within {clearance:.2f} mm of a measured point")
-    border = np.round(border, 4)
     layout = Layout(border[:, 0].min(), border[:, 1].max(), border[:, 1].min())
     where = {int(p): k for k, p in enumerate(ids)}
     eye = _catmull_rom(flat[[where[p] for p in sample_mesh.EYE_RING]], closed=True)
@@ -155,8 +172,7 @@ def build(data):
     patch = {k: layout.flat(*uv) for k, uv in FIRST_TEXTURE.items()}
     patch.update({k: np.array(v) for k, v in PATCH_FLAT.items()})
     dom = Domain(layout, ids, flat, triangles, border, eye, mouth,
-                  flat[[where[p] for p in nostril.rim_ids(data)]], patch,
-                 data.points[ids])
+                 flat[[where[p] for p in nostril.rim_ids(data)]], patch, data.points[ids])
     dom.rows = outline.rows(dom.flat_of, dom.place)
     dom.stops = outline.border_stops(dom.flat_of, dom.place, border)
     return dom

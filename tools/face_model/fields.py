@@ -11,9 +11,9 @@ from dataclasses import dataclass
 
 import numpy as np
 import scipy.sparse as sp
-from scipy.sparse.linalg import splu
 from scipy.spatial import cKDTree
 
+from arithmetic import Solver, length
 from triangulate import edge_owners
 
 
@@ -44,7 +44,7 @@ def _cot(points, at, one, two):
     if points.shape[1] == 2:
         cross = np.abs(a[:, 0] * b[:, 1] - a[:, 1] * b[:, 0])
     else:
-        cross = np.linalg.norm(np.cross(a, b), axis=1)
+        cross = length(np.cross(a, b))
     return np.einsum("ij,ij->i", a, b) / np.maximum(cross, 1e-9), 0.5 * cross
 
 
@@ -101,7 +101,7 @@ def locate(flat, triangles, places):
 def through_values(quadratic, matrix, values, weights):
     """Fields (count, k) that bend least while `matrix @ field` stays at `values` (n, k)."""
     pull = matrix.T @ sp.diags(weights)
-    return splu((quadratic + pull @ matrix).tocsc()).solve(np.asarray(pull @ values))
+    return Solver(quadratic + pull @ matrix)(np.asarray(pull @ values))
 
 
 def surface_through(quadratic, matrix, points, weights, slopes, slope_weight):
@@ -113,4 +113,4 @@ def surface_through(quadratic, matrix, points, weights, slopes, slope_weight):
     pull = matrix.T @ sp.diags(weights)
     system = sp.block_diag([quadratic + pull @ matrix] * 3) + slope_weight * (slopes.T @ slopes)
     right = np.concatenate([pull @ points[:, k] for k in range(3)])
-    return splu(system.tocsc()).solve(right).reshape(3, count).T
+    return Solver(system)(right).reshape(3, count).T

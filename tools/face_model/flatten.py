@@ -8,21 +8,22 @@ mappings", 2017).
 
 import numpy as np
 import scipy.sparse as sp
-from scipy.sparse.linalg import splu
+
+from arithmetic import Solver, length
 
 
 def gradients(corners):
     """Per triangle (n, 3 corners, 3) the area and the gradients (2 x 3) in its own plane."""
     a, b, c = (corners[:, k] for k in range(3))
     e, f = b - a, c - a
-    length = np.linalg.norm(e, axis=1)
-    x = np.einsum("ij,ij->i", e, f) / length
-    y = np.linalg.norm(np.cross(e, f), axis=1) / length
-    area = 0.5 * length * y
+    base = length(e)
+    x = np.einsum("ij,ij->i", e, f) / base
+    y = length(np.cross(e, f)) / base
+    area = 0.5 * base * y
     grad = np.zeros((len(corners), 2, 3))
-    grad[:, 0, 0], grad[:, 0, 1] = -1.0 / length, 1.0 / length
-    grad[:, 1, 0] = (x / length - 1.0) / y
-    grad[:, 1, 1] = -x / length / y
+    grad[:, 0, 0], grad[:, 0, 1] = -1.0 / base, 1.0 / base
+    grad[:, 1, 0] = (x / base - 1.0) / y
+    grad[:, 1, 1] = -x / base / y
     grad[:, 1, 2] = 1.0 / y
     return area, grad
 
@@ -51,6 +52,8 @@ def symmetric_dirichlet(corners, plane, triangles, on_axis, rounds=80):
     pinned = np.zeros(2 * count, bool)
     pinned[on_axis] = True  # x of the axis vertices
     free = np.flatnonzero(~pinned)
+    # Moving the whole sheet along y changes nothing. Held here, it does not drift by rounding.
+    height = round(plane[:, 1].mean(), 7)
     best = energy(jacobians(plane, triangles, grad), area)
     if not np.isfinite(best):
         raise ValueError("the starting layout has folded triangles")
@@ -78,16 +81,17 @@ def symmetric_dirichlet(corners, plane, triangles, on_axis, rounds=80):
         normal = (a.T @ a + 1e-6 * sp.eye(2 * count)).tocsc()
         right = a.T @ rhs + 1e-6 * now
         solution = now.copy()
-        solution[free] = splu(normal[free][:, free]).solve(
+        solution[free] = Solver(normal[free][:, free])(
             right[free] - normal[free][:, np.flatnonzero(pinned)] @ now[pinned])
+        solution[count:] += height - solution[count:].mean()
         step = solution.reshape(2, count).T - plane
-        length = 1.0
-        while length > 1e-6:
-            trial = plane + length * step
+        share = 1.0
+        while share > 1e-6:
+            trial = plane + share * step
             value = energy(jacobians(trial, triangles, grad), area)
             if value < best:
                 break
-            length *= 0.6
+            share *= 0.6
         else:
             break
         gain = best - value

@@ -20,6 +20,7 @@ import tables
 import tensor
 import topology
 import writer
+from arithmetic import settled
 
 
 def build():
@@ -32,7 +33,8 @@ def build():
     mesh = topology.mirrored(half.flat, half.triangles, half.middle)
     lifted = surface.lift(data, dom, mesh)
     mean, identity, expression = surface.modes(data, mesh, lifted)
-    mean, identity, expression = (np.round(a, 5) for a in (mean, identity, expression))
+    mean = settled(mean, 5, doubt=1e-10, nudge=-1e-9 * np.sign(mean))  # both sides alike
+    identity, expression = (settled(a, 5, doubt=1e-12) for a in (identity, expression))
 
     owners = numbering.edge_owners(mesh.triangles)
     known = numbering.known_vertices(data, half, mesh, owners)

@@ -5,6 +5,7 @@ import numpy as np
 from scipy.optimize import linear_sum_assignment
 
 import tables
+from arithmetic import length
 from triangulate import edge_owners
 
 
@@ -39,7 +40,7 @@ def _pair(mesh, mean, owners, taken, near):
         t, u = mesh.triangles[faces[0]].tolist(), mesh.triangles[faces[1]].tolist()
         if taken & (set(t) | set(u)):
             continue
-        distance = np.linalg.norm(mean[list(set(t) | set(u))] - near, axis=1).sum()
+        distance = length(mean[list(set(t) | set(u))] - near).sum()
         if best is None or distance < best[0]:
             k = next(k for k in range(3) if t[k] not in edge)
             best = (distance, t[k], t[(k + 1) % 3], t[(k + 2) % 3],
@@ -71,7 +72,7 @@ def number(data, half, mesh, mean, candidates):
     for among_candidates in (True, False):
         numbers = [n for n in range(len(mean)) if order[n] < 0 and (n in table) == among_candidates]
         free = [v for v in range(len(mean)) if v not in used and (v in inside) == among_candidates]
-        cost = np.linalg.norm(target[numbers][:, None] - mean[free][None], axis=2)
+        cost = length(target[numbers][:, None] - mean[free][None])
         rows, columns = linear_sum_assignment(np.round(cost, 3))
         for r, c in zip(rows, columns):
             order[numbers[r]] = free[c]

@@ -9,6 +9,8 @@ nothing. Two further rows lie between each two, so that no part of an outline is
 
 import numpy as np
 
+from arithmetic import dot, length
+
 # Landmark, and the ends of its row at image left on the mean head (mm): before the ear, on the
 # cheek.
 ROWS = [
@@ -29,7 +31,7 @@ COLUMN = 6.2  # mm between the vertices of a row
 
 def _resampled(line, places):
     """Points of a polyline at shares of its length."""
-    step = np.linalg.norm(np.diff(line, axis=0), axis=1)
+    step = length(np.diff(line, axis=0))
     along = np.concatenate([[0.0], np.cumsum(step)]) / step.sum()
     return np.column_stack([np.interp(places, along, line[:, k]) for k in range(line.shape[1])])
 
@@ -60,12 +62,11 @@ def rows(flat_of, place_of):
     for row, line in _lines(flat_of, place_of):
         if row == int(row):
             for end in (line[0], line[2]):
-                count = max(1, int(round(np.linalg.norm(end - line[1]) / COLUMN)))
+                count = max(1, int(round(length(end - line[1]) / COLUMN)))
                 shares = np.arange(1, count + 1) / count
                 out += [(row, line[1] + s * (end - line[1])) for s in shares]
             continue
-        length = np.linalg.norm(np.diff(line, axis=0), axis=1).sum()
-        count = max(1, int(round(length / COLUMN)))
+        count = max(1, int(round(length(np.diff(line, axis=0)).sum() / COLUMN)))
         shift = 0.75 if row - int(row) < 0.5 else 0.25
         out += [(row, p) for p in _resampled(line, (np.arange(count) + shift) / count)]
     return out
@@ -73,14 +74,14 @@ def rows(flat_of, place_of):
 
 def border_stops(flat_of, place_of, border):
     """Where the rows before the ear, carried on, meet the border: (row, length along it)."""
-    along = np.concatenate([[0.0], np.cumsum(np.linalg.norm(np.diff(border, axis=0), axis=1))])
+    along = np.concatenate([[0.0], np.cumsum(length(np.diff(border, axis=0)))])
     out = []
     for row, line in _lines(flat_of, place_of):
         if row > LAST_AT_BORDER:
             break
         way = line[0] - line[1]
-        side = (border - line[0]) @ np.array([-way[1], way[0]])
-        ahead = (border - line[0]) @ way > 0
+        side = dot(border - line[0], np.array([-way[1], way[0]]))
+        ahead = dot(border - line[0], way) > 0
         k = int(np.flatnonzero((side[:-1] * side[1:] <= 0) & ahead[:-1])[0])
         share = side[k] / (side[k] - side[k + 1])
         out.append((row, along[k] + share * (along[k + 1] - along[k])))

@@ -5,6 +5,7 @@ import numpy as np
 from scipy.spatial import Delaunay, cKDTree
 
 import fields
+from arithmetic import length
 from triangulate import flip_by_shape, signed_areas
 
 WALL_DISTANCE = 0.6  # of the wanted edge length, between free vertices and edges that stay
@@ -19,9 +20,9 @@ def _unique_edges(triangles):
 def _pushes(points, edges, wanted):
     """Sum of the spring forces on each vertex; springs push only."""
     vector = points[edges[:, 0]] - points[edges[:, 1]]
-    length = np.linalg.norm(vector, axis=1)
-    wanted = wanted * STRETCH * np.sqrt((length**2).sum() / (wanted**2).sum())
-    push = vector * (np.maximum(wanted - length, 0.0) / length)[:, None]
+    now = length(vector)
+    wanted = wanted * STRETCH * np.sqrt((now**2).sum() / (wanted**2).sum())
+    push = vector * (np.maximum(wanted - now, 0.0) / now)[:, None]
     total = np.zeros_like(points)
     np.add.at(total, edges[:, 0], push)
     np.add.at(total, edges[:, 1], -push)

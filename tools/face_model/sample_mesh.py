@@ -6,6 +6,7 @@ Only the half at image left (x <= 0) is worked on; the other half is its mirror 
 
 import numpy as np
 
+from arithmetic import length
 from flatten import symmetric_dirichlet
 from nostril import rim_ids
 from triangulate import flip_by_shape, signed_areas, with_edges
@@ -24,7 +25,7 @@ LONGEST_EDGE = 27.0  # mm; longer edges bridge notches of the outline
 
 def _project(points):
     offset = points - CENTRE
-    angle = np.arccos(offset[:, 2] / np.linalg.norm(offset, axis=1))
+    angle = np.arccos(offset[:, 2] / length(offset))
     turn = np.arctan2(offset[:, 1], offset[:, 0])
     return PLANE_SCALE * np.column_stack([angle * np.cos(turn), angle * np.sin(turn)])
 
@@ -57,7 +58,7 @@ def build(data):
         return set(mouth).issuperset(t) or set(eye).issuperset(t)
 
     def short(t):
-        edges = [np.linalg.norm(posed[t[k]] - posed[t[k - 1]]) for k in range(3)]
+        edges = [length(posed[t[k]] - posed[t[k - 1]]) for k in range(3)]
         return max(edges) < LONGEST_EDGE and abs(signed_areas(plane, np.array([t]))[0]) > 0.05
 
     fill = np.array([t for t in triangles.tolist() if in_hole(t)])

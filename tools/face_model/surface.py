@@ -7,6 +7,7 @@ import numpy as np
 import scipy.sparse as sp
 
 import fields
+from arithmetic import length
 
 POINT_WEIGHT = 1e3
 NORMAL_WEIGHT = 4.0
@@ -39,11 +40,11 @@ def _slopes(points, triangles, anchors, normals):
     row = 0
     for corner, normal in zip(corners, normals):
         for k in (1, 2):
-            length = np.linalg.norm(points[corner[k]] - points[corner[0]])
+            along = length(points[corner[k]] - points[corner[0]])
             for axis in range(3):
                 rows += [row, row]
                 columns += [corner[k] + axis * count, corner[0] + axis * count]
-                values += [normal[axis] / length, -normal[axis] / length]
+                values += [normal[axis] / along, -normal[axis] / along]
             row += 1
     return sp.csr_matrix((values, (rows, columns)), (row, 3 * count))
 
@@ -68,7 +69,7 @@ def lift(data, dom, mesh, normal_weight=NORMAL_WEIGHT):
     places = data.points[known.ids]
 
     weights = np.where(data.measured[known.ids], POINT_WEIGHT, GUIDE_WEIGHT)
-    slope_known = np.linalg.norm(data.normals[known.ids], axis=1) > 0.5
+    slope_known = length(data.normals[known.ids]) > 0.5
 
     quadratic = fields.bending(flat, triangles)
     points = fields.through_values(quadratic, matrix, places, weights)

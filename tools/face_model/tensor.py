@@ -13,9 +13,9 @@ one, so that a person with large eyes can shut them.
 
 import numpy as np
 import scipy.sparse as sp
-from scipy.sparse.linalg import splu
 
 import writer
+from arithmetic import Solver, dot, length
 
 FAR_WEIGHT = 0.05  # holds the change at zero where the expression does not move the skin
 MOVES = 0.35  # mm; skin that moves less is far from the expression
@@ -27,7 +27,7 @@ def _frames(points, triangles):
     a, b, c = (points[triangles[:, k]] for k in range(3))
     e, f = b - a, c - a
     n = np.cross(e, f)
-    n = n / np.sqrt(np.maximum(np.linalg.norm(n, axis=1), 1e-9))[:, None]
+    n = n / np.sqrt(np.maximum(length(n), 1e-9))[:, None]
     return np.stack([e, f, n], axis=2)
 
 
@@ -35,7 +35,7 @@ def _gradient_operator(points, triangles):
     """Per triangle the 3 x 3 map from corner values to the gradient on the surface, and areas."""
     a, b, c = (points[triangles[:, k]] for k in range(3))
     normal = np.cross(b - a, c - a)
-    double = np.linalg.norm(normal, axis=1)
+    double = length(normal)
     normal = normal / double[:, None]
     edges = np.stack([c - b, a - c, b - a], axis=2)
     return np.cross(normal[:, :, None], edges, axisa=1, axisb=1, axisc=1) / double[:, None, None], \
@@ -52,8 +52,8 @@ def lid_contacts(face, upper, lower):
         best = None
         for a, b in zip(lower, lower[1:]):
             along = face[b] - face[a]
-            t = float(np.clip((face[v] - face[a]) @ along / (along @ along), 0.0, 1.0))
-            distance = np.linalg.norm(face[a] + t * along - face[v])
+            t = float(np.clip(dot(face[v] - face[a], along) / dot(along, along), 0.0, 1.0))
+            distance = length(face[a] + t * along - face[v])
             if best is None or distance < best[0] - 1e-9:
                 best = (distance, a, b, t)
         out.append((v, *best[1:]))
@@ -74,7 +74,7 @@ class Transfer:
         operator = sp.csr_matrix(
             (gradient.ravel(), (rows, columns)), (3 * len(self.triangles), len(points)))
         weighted = operator.T @ sp.diags(np.repeat(area, 3))
-        size = np.linalg.norm(move, axis=1)
+        size = length(move)
         far = FAR_WEIGHT * np.exp(-((size / MOVES) ** 2)) + 1e-5
         return operator, weighted, weighted @ operator + sp.diags(far)
 
@@ -88,7 +88,7 @@ class Transfer:
         operator, weighted, system = self._system(face, move)
         slope = (operator @ face).reshape(-1, 3, 3)
         wanted = np.einsum("tcd,tgd->tgc", self._change(mean, move), slope).reshape(-1, 3)
-        return splu(system.tocsc()).solve(weighted @ wanted)
+        return Solver(system)(weighted @ wanted)
 
     def first_order(self, mean, move, identity, contacts):
         """Change of the displacement for one unit of each identity mode."""
@@ -97,7 +97,7 @@ class Transfer:
         touch = sp.csr_matrix(
             (np.ones(len(contacts)), (np.arange(len(contacts)), [c[0] for c in contacts])),
             (len(contacts), len(mean)))
-        solver = splu((system + CONTACT_WEIGHT * touch.T @ touch).tocsc())
+        solve = Solver(system + CONTACT_WEIGHT * touch.T @ touch)
         out = []
         for mode in identity:
             slope = (operator @ mode).reshape(-1, 3, 3)
@@ -106,7 +106,7 @@ class Transfer:
                 follow = np.array([(1 - t) * mode[a] + t * mode[b] - mode[v]
                                    for v, a, b, t in contacts])
                 right = right + CONTACT_WEIGHT * (touch.T @ follow)
-            out.append(solver.solve(right))
+            out.append(solve(right))
         return np.array(out)
 
 

@@ -11,6 +11,7 @@ import numpy as np
 from scipy.spatial import cKDTree
 
 import domain as domain_module
+from arithmetic import length, settled
 from relax import spread, spread_on_surface
 from triangulate import with_edges
 
@@ -52,7 +53,7 @@ class HalfMesh:
 
 def _spaced(line, count, weight=None):
     """`count` + 1 places along a polyline, both ends included, denser where weight is small."""
-    step = np.linalg.norm(np.diff(line, axis=0), axis=1)
+    step = length(np.diff(line, axis=0))
     if weight is not None:
         step = step / weight[:-1]
     along = np.concatenate([[0.0], np.cumsum(step)])
@@ -67,8 +68,8 @@ def _border_places(dom):
     outlines meet it; above and below them the edges are even.
     """
     line = dom.border
-    along = np.concatenate([[0.0], np.cumsum(np.linalg.norm(np.diff(line, axis=0), axis=1))])
-    stops = [length for _, length in dom.stops]
+    along = np.concatenate([[0.0], np.cumsum(length(np.diff(line, axis=0)))])
+    stops = [along_border for _, along_border in dom.stops]
     rest = domain_module.BORDER_EDGES - (len(stops) - 1)
     above = int(round(rest * stops[0] / (stops[0] + along[-1] - stops[-1])))
     places = np.concatenate([np.linspace(0.0, stops[0], above + 1)[:-1], stops,
@@ -186,7 +187,7 @@ def _middle_counts(spans, sizing):
     for marks in spans:
         for a, b in zip(marks, marks[1:]):
             dense = np.linspace(a, b, 200)
-            step = np.linalg.norm(b - a) / 199
+            step = length(b - a) / 199
             want.append((step / sizing(dense)).sum())
     want = np.array(want)
     total = MIDDLE_VERTICES - len(spans)  # edges on the middle line
@@ -270,7 +271,9 @@ def lid_rims(half, mesh):
 def refined(half, surface):
     """The half mesh spread anew with the lengths it has on the lifted surface."""
     flat, triangles = spread_on_surface(half, surface)
-    return replace(half, flat=np.round(flat, 5), triangles=triangles)
+    # Vertices that rest half way between two places on a wall are half way between decimals, too.
+    flat = settled(flat, 5, doubt=1e-10, nudge=-1e-9)
+    return replace(half, flat=flat, triangles=triangles)
 
 
 @dataclass

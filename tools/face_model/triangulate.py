@@ -1,8 +1,12 @@
 # SPDX-License-Identifier: MIT
 """Delaunay triangulation in the plane that keeps given edges, and flips by shape in space."""
 
+from collections.abc import Collection
+
 import numpy as np
 from scipy.spatial import Delaunay
+
+from arithmetic import dot, length
 
 
 def signed_areas(plane, triangles):
@@ -48,9 +52,8 @@ def _crosses(p, q, r, s):
     return _cross(p, q, r) * _cross(p, q, s) < 0 and _cross(r, s, p) * _cross(r, s, q) < 0
 
 
-def _flip(triangles, faces, edge):
-    """The two triangles after the flip, or None if the quadrilateral is not convex."""
-    t, u = triangles[faces[0]], triangles[faces[1]]
+def _flip(t, u, edge):
+    """The two triangles after the flip of the edge between t and u."""
     apex = next(v for v in t if v not in edge)
     other = next(v for v in u if v not in edge)
     k = t.index(apex)
@@ -75,7 +78,7 @@ def with_edges(plane, edges):
             for edge in sorted(owners):
                 if set(edge) & set(goal) or not _crosses(p, q, plane[edge[0]], plane[edge[1]]):
                     continue
-                pair = _flip(triangles, owners[edge], edge)
+                pair = _flip(*(triangles[f] for f in owners[edge]), edge)
                 if (signed_areas(plane, np.array(pair)) <= 1e-9).any():
                     continue
                 new = tuple(sorted(set(pair[0]) & set(pair[1])))
@@ -91,37 +94,50 @@ def with_edges(plane, edges):
     return np.array(triangles)
 
 
-def _angle(points, triangle, edge):
-    apex = next(v for v in triangle if v not in edge)
-    a, b = points[edge[0]] - points[apex], points[edge[1]] - points[apex]
-    return np.arctan2(np.linalg.norm(np.cross(a, b)), a @ b), apex
+def _blunt(points, triangles, faces, edges):
+    """Marks the edges whose two facing angles sum to more than pi: the sine of the sum is negative.
+
+    A sum that is pi but for rounding, as in a rectangle, does not count.
+    """
+    corners = triangles[faces]  # (edges, 2, 3)
+    apex = corners.sum(axis=2) - edges.sum(axis=1)[:, None]
+    a = points[edges[:, 0]][:, None] - points[apex]
+    b = points[edges[:, 1]][:, None] - points[apex]
+    if points.shape[1] == 2:
+        sine = np.abs(a[..., 0] * b[..., 1] - a[..., 1] * b[..., 0])
+    else:
+        sine = length(np.cross(a, b))
+    cosine = dot(a, b)
+    size = np.sqrt(sine**2 + cosine**2).prod(axis=1)
+    return sine[:, 0] * cosine[:, 1] + cosine[:, 0] * sine[:, 1] < -1e-6 * size
 
 
-def flip_by_shape(points, plane, triangles, keep=frozenset()):
+def flip_by_shape(points: np.ndarray, plane: np.ndarray, triangles: np.ndarray,
+                  keep: Collection[tuple[int, int]] = frozenset()) -> np.ndarray:
     """Flips edges until the two angles facing each edge, measured on `points`, sum below pi.
 
     Edges in `keep` (ascending pairs) stay, and no flip turns a triangle over in the plane.
     """
-    triangles = [tuple(t) for t in np.asarray(triangles).tolist()]
+    triangles = np.array(triangles)
     for _ in range(50):
         owners = edge_owners(triangles)
+        inner = [edge for edge in sorted(owners) if len(owners[edge]) == 2 and edge not in keep]
+        faces = np.array([owners[edge] for edge in inner])
+        blunt = _blunt(points, triangles, faces, np.array(inner))
         touched, flips = set(), 0
-        for edge in sorted(owners):
-            faces = owners[edge]
-            if len(faces) != 2 or edge in keep or touched.intersection(faces):
+        for edge in (inner[k] for k in np.flatnonzero(blunt)):
+            if touched.intersection(owners[edge]):
                 continue
-            angle_0, apex_0 = _angle(points, triangles[faces[0]], edge)
-            angle_1, apex_1 = _angle(points, triangles[faces[1]], edge)
-            if angle_0 + angle_1 <= np.pi + 1e-6:
+            one, other = (triangles[f].tolist() for f in owners[edge])
+            tips = sorted(v for v in one + other if v not in edge)
+            if tuple(tips) in owners:
                 continue
-            if (min(apex_0, apex_1), max(apex_0, apex_1)) in owners:
-                continue
-            pair = _flip(triangles, faces, edge)
+            pair = _flip(one, other, edge)
             if (signed_areas(plane, np.array(pair)) <= 1e-3).any():
                 continue
-            triangles[faces[0]], triangles[faces[1]] = pair
-            touched.update(faces)
+            triangles[owners[edge]] = pair
+            touched.update(owners[edge])
             flips += 1
         if not flips:
             break
-    return np.array(triangles)
+    return triangles

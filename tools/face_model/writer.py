@@ -3,6 +3,8 @@
 
 import numpy as np
 
+from arithmetic import dot
+
 # From the upright head frame to the frame of the file: 20 degrees about x, which the engine's
 # output takes back. The rows are the engine's own constants.
 TILT = np.array([[1.0, 0.0, 0.0], [0.0, 0.9397, 0.342], [0.0, -0.342, 0.9397]])
@@ -14,8 +16,9 @@ IDENTITY_UNIT = 8.0
 TENSOR_STEP = 40.0  # units of 1/256 mm
 
 
-def tilted(vectors):
-    return vectors @ TILT.T
+def tilted(vectors: np.ndarray) -> np.ndarray:
+    """Vectors (..., 3) in the file's frame, from the upright one."""
+    return np.stack([dot(vectors, row) for row in TILT], axis=-1)
 
 
 def fixed(vectors, kind="<i2"):
