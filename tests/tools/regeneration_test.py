@@ -54,10 +54,10 @@ def make_model(tools, scratch):
 
 
 def make_assets(tools, scratch):
-    run(tools / "make_sticker_assets.py", "--out", scratch)
+    run(tools / "assets" / "make_sticker_assets.py", "--out", scratch)
     if not is_there("PIL"):
         return "examples/assets", STICKERS
-    run(tools / "make_mask_textures.py", "--out", scratch)
+    run(tools / "assets" / "make_mask_textures.py", "--out", scratch)
     return "examples/assets", STICKERS + MASKS
 
 

@@ -4,7 +4,9 @@
 import numpy as np
 from scipy.spatial import cKDTree
 
+import fields
 import render
+from shipped import Model
 
 CAMERA_DISTANCE = 700.0
 ROW = 2.0  # mm between the rows in which an outline is read
@@ -24,7 +26,7 @@ INNER_END = np.array(
     [(-92, 0), (-86, 14), (-80, 27), (-68, 32), (-30, 33), (5, 44), (24, 50), (60, 50)])
 
 
-def outline_skin(points, top=TEMPLES):
+def outline_skin(points: np.ndarray, top: float = TEMPLES) -> np.ndarray:
     """Marks the skin of the cheeks, the jaw and the chin on which outlines run.
 
     Not the underside of the chin: a candidate there would draw the chin's landmarks backwards and
@@ -36,7 +38,7 @@ def outline_skin(points, top=TEMPLES):
     return above_jaw & outside & before_ear & (points[:, 1] < top)
 
 
-def spare(points):
+def spare(points: np.ndarray) -> np.ndarray:
     """How fit each vertex is as a candidate that no outline landmark should ever find.
 
     That is its distance from the outline skin, on the forehead and beside eyes, nose and mouth.
@@ -49,13 +51,13 @@ def spare(points):
     return np.where(beside | (height > FOREHEAD), distance, -1.0)
 
 
-def seen_from(points, yaw, pitch):
+def seen_from(points: np.ndarray, yaw: float, pitch: float) -> np.ndarray:
     """Places in the picture of a turned head, in mm at the head's own distance."""
     turned = render.turned(points, yaw, pitch)
     return turned[:, :2] / (CAMERA_DISTANCE - turned[:, 2:]) * CAMERA_DISTANCE
 
 
-def silhouette(picture):
+def silhouette(picture: np.ndarray) -> np.ndarray:
     """Numbers of the places furthest out to the left and to the right, row by row."""
     level = np.round(picture[:, 1] / ROW).astype(int)
     out = []
@@ -65,7 +67,8 @@ def silhouette(picture):
     return np.concatenate(out)
 
 
-def choose(points, mirror, must, never, wanted):
+def choose(points: np.ndarray, mirror: np.ndarray, must: list[int], never: list[int],
+           wanted: int) -> list[int]:
     """`wanted` vertices, symmetric: `must` and their mirrors, and the rest where they do no harm.
 
     Candidates between the rows of the outline landmarks would let the landmarks slide along the
@@ -95,13 +98,13 @@ def choose(points, mirror, must, never, wanted):
     return sorted(chosen)
 
 
-def coverage(model, table, pitches, spread, people=20):
+def coverage(model: Model, table: np.ndarray, pitches: tuple[float, ...], spread: float,
+             people: int = 20) -> tuple[float, float, int]:
     """How well candidates cover the outline at yaws from -60 to 60 degrees, row by row.
 
     Returns the share of rows with a candidate within reach of the outline's place in the picture,
     the share with one within reach on the skin, and the number of rows.
     """
-    import fields
     cut = fields.subdivision_matrix(len(model.mean), model.triangles)
     _, triangles = fields.subdivided(model.texture, model.triangles)
     cut = fields.subdivision_matrix(cut.shape[0], triangles) @ cut

@@ -41,7 +41,7 @@ class Report:
         print(f"       {name:<58} {value:>22}")
 
 
-def check_landmarks(model, report):
+def check_landmarks(model: Model, report: Report):
     report.head("Landmarks")
     points = measurements.load().points
     off = max(np.linalg.norm(model.mean[v] - points[k])
@@ -50,13 +50,13 @@ def check_landmarks(model, report):
                 "< 0.1")
 
 
-def interaction(model, person, amounts):
+def interaction(model: Model, person: np.ndarray, amounts: np.ndarray) -> np.ndarray:
     """What the dense mesh adds for identity (standard deviations) times expression."""
     used = tensor.read_pairs() * np.outer(person, amounts)
     return np.tensordot(used, model.tensor, 2)
 
 
-def check_transfer(model, report):
+def check_transfer(model: Model, report: Report):
     """Does the tensor bring an unusual face's expressions nearer to what its own shape asks for?
 
     The measure is the whole deformation transfer, which the tensor holds to first order only.
@@ -81,7 +81,7 @@ def check_transfer(model, report):
                     f"{a:.2f}, {b:.2f}", b < a)
 
 
-def check_reconstruction(model, report):
+def check_reconstruction(model: Model, report: Report):
     report.head("Reconstruction of the measured figures, mean distance in mm")
     data = nostril.with_nostrils(measurements.load())
     dom = domain.build(data)
@@ -92,7 +92,10 @@ def check_reconstruction(model, report):
     upright = model.texture * [1.0, -1.0]
     anchors = fields.locate(upright, model.triangles, places)
     matrix = anchors.matrix(model.triangles, len(model.mean))
-    mean_error = lambda field, wanted: np.linalg.norm(matrix @ field - wanted, axis=1).mean()
+
+    def mean_error(field, wanted):
+        return np.linalg.norm(matrix @ field - wanted, axis=1).mean()
+
     value = mean_error(model.mean, data.points[ids])
     report.line(f"mean face, {len(ids)} points", f"{value:.3f}", value < 0.3, "< 0.3")
     worst = 0.0
@@ -108,7 +111,7 @@ def check_reconstruction(model, report):
                 f"{errors[worst]:.3f}", errors[worst] < 0.5, "< 0.5")
 
 
-def check_candidates(model, report):
+def check_candidates(model: Model, report: Report):
     report.head("Contour candidates: outline rows with one within 3 mm, %")
     table = tables.contour_candidates()
     for title, pitches, spread in (("mean face", (0.0,), 0.0),

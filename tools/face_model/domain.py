@@ -17,16 +17,16 @@ import sample_mesh
 from arithmetic import length, settled
 from measurements import Measurements
 
-# The rectangle of the texture that the face fills, and its middle line. Fixed: masks are painted
-# in this layout, so a new model has to keep it.
+# The rectangle of the texture that the face fills, and its middle line. Fixed: part of the file
+# format, for masks are painted in this layout.
 U_MIDDLE = 0.499946
-U_LEFT, U_RIGHT = 0.016646, 0.983246
+U_LEFT = 0.016646
 V_TOP, V_BOTTOM = 0.002930, 0.997054
 # The texture keeps the middle of the face in true proportion and narrows the sides.
 MIDDLE_PROPORTION = 0.95
 
-# Texture places of the vertices 0 to 2, before the ear at image left, fixed as the layout is;
-# vertex 1 has exactly the neighbours 0, 2, 4 and 3.
+# Texture places of the vertices 0 to 2, before the ear at image left; fixed, too. Vertex 1 has
+# exactly the neighbours 0, 2, 4 and 3.
 FIRST_TEXTURE = {0: (0.069524, 0.281949), 1: (0.081158, 0.319456), 2: (0.038178, 0.318155)}
 # Flat places (mm) of the two others, below them and inside the border.
 PATCH_FLAT = {3: (-102.5, 17.0), 4: (-110.0, 4.0)}
@@ -35,6 +35,7 @@ BORDER_CENTRE_Y = -30.0
 BORDER_MARGIN = 2.5
 BORDER_EDGES = 50  # of the half face; with 24 round the eye and 12 along the mouth 86 of 172
 BORDER_TERMS = 12
+CURVE_STEPS = 24  # places of a dense curve from one of its points to the next
 
 
 @dataclass
@@ -117,8 +118,8 @@ def _mix(a, b, low, high, t):
     return ((high - t) * a + (t - low) * b) / (high - low)
 
 
-def _catmull_rom(points, closed, steps=24):
-    """Dense centripetal curve through the points; the points themselves are every steps-th."""
+def _catmull_rom(points, closed):
+    """Dense centripetal curve through the points, which are every CURVE_STEPS-th of its places."""
     n = len(points)
     if closed:
         padded = np.concatenate([points[-1:], points, points[:2]])
@@ -129,8 +130,8 @@ def _catmull_rom(points, closed, steps=24):
     for k in range(n if closed else n - 1):
         p = padded[k:k + 4]
         knots = np.concatenate([[0.0], np.cumsum(np.sqrt(length(np.diff(p, axis=0))))])
-        for s in range(steps):
-            t = knots[1] + (knots[2] - knots[1]) * s / steps
+        for s in range(CURVE_STEPS):
+            t = knots[1] + (knots[2] - knots[1]) * s / CURVE_STEPS
             first = [_mix(p[i], p[i + 1], knots[i], knots[i + 1], t) for i in range(3)]
             second = [_mix(first[i], first[i + 1], knots[i], knots[i + 2], t) for i in range(2)]
             out.append(_mix(second[0], second[1], knots[1], knots[2], t))

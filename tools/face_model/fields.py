@@ -7,6 +7,8 @@ field over its two triangles, unfolded flat. Straight-line fields cost nothing, 
 so lids and lips end freely and do not feel each other across the open eye or mouth.
 """
 
+from __future__ import annotations
+
 from dataclasses import dataclass
 
 import numpy as np
@@ -17,7 +19,7 @@ from arithmetic import Solver, length
 from triangulate import edge_owners
 
 
-def subdivided(places, triangles):
+def subdivided(places: np.ndarray, triangles: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
     """Each triangle cut in four; the given vertices keep their numbers."""
     edges = np.unique(np.sort(np.concatenate(
         [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
@@ -30,7 +32,7 @@ def subdivided(places, triangles):
     return np.concatenate([places, middle]), np.array(out)
 
 
-def subdivision_matrix(count, triangles):
+def subdivision_matrix(count: int, triangles: np.ndarray) -> sp.csr_matrix:
     """The linear map from vertex values to those of the mesh cut in four."""
     edges = np.unique(np.sort(np.concatenate(
         [triangles[:, [0, 1]], triangles[:, [1, 2]], triangles[:, [2, 0]]]), axis=1), axis=0)
@@ -48,7 +50,7 @@ def _cot(points, at, one, two):
     return np.einsum("ij,ij->i", a, b) / np.maximum(cross, 1e-9), 0.5 * cross
 
 
-def bending(points, triangles):
+def bending(points: np.ndarray, triangles: np.ndarray) -> sp.csc_matrix:
     """The sparse form Q with f' Q f the bending of the field f; lengths are those of `points`."""
     hinges = []
     for edge, faces in sorted(edge_owners(triangles).items()):
@@ -75,16 +77,17 @@ class Anchors:
     triangle: np.ndarray
     weights: np.ndarray
 
-    def part(self, chosen):
+    def part(self, chosen: np.ndarray) -> Anchors:
         return Anchors(self.triangle[chosen], self.weights[chosen])
 
-    def matrix(self, triangles, count):
+    def matrix(self, triangles: np.ndarray, count: int) -> sp.csr_matrix:
+        """Maps values at `count` vertices to values at the places."""
         rows = np.repeat(np.arange(len(self.triangle)), 3)
         return sp.csr_matrix((self.weights.ravel(), (rows, triangles[self.triangle].ravel())),
                              (len(self.triangle), count))
 
 
-def locate(flat, triangles, places):
+def locate(flat: np.ndarray, triangles: np.ndarray, places: np.ndarray) -> Anchors:
     """The triangle of each place, or the nearest one for places a little outside."""
     a, b, c = (flat[triangles[:, k]] for k in range(3))
     det = (b - a)[:, 0] * (c - a)[:, 1] - (b - a)[:, 1] * (c - a)[:, 0]
@@ -98,13 +101,15 @@ def locate(flat, triangles, places):
     return Anchors(near[rows, best], w[rows, best])
 
 
-def through_values(quadratic, matrix, values, weights):
+def through_values(quadratic: sp.spmatrix, matrix: sp.spmatrix, values: np.ndarray,
+                   weights: np.ndarray) -> np.ndarray:
     """Fields (count, k) that bend least while `matrix @ field` stays at `values` (n, k)."""
     pull = matrix.T @ sp.diags(weights)
     return Solver(quadratic + pull @ matrix)(np.asarray(pull @ values))
 
 
-def surface_through(quadratic, matrix, points, weights, slopes, slope_weight):
+def surface_through(quadratic: sp.spmatrix, matrix: sp.spmatrix, points: np.ndarray,
+                    weights: np.ndarray, slopes: sp.spmatrix, slope_weight: float) -> np.ndarray:
     """Vertex positions (count, 3) through `points`; `slopes` (m, 3 count) @ x should vanish.
 
     The unknowns of `slopes` are ordered x of all vertices, then y, then z.

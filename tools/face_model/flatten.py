@@ -12,7 +12,7 @@ import scipy.sparse as sp
 from arithmetic import Solver, length
 
 
-def gradients(corners):
+def gradients(corners: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
     """Per triangle (n, 3 corners, 3) the area and the gradients (2 x 3) in its own plane."""
     a, b, c = (corners[:, k] for k in range(3))
     e, f = b - a, c - a
@@ -28,11 +28,13 @@ def gradients(corners):
     return area, grad
 
 
-def jacobians(plane, triangles, grad):
+def jacobians(plane: np.ndarray, triangles: np.ndarray, grad: np.ndarray) -> np.ndarray:
+    """Jacobians (n, 2, 2) of the maps from each triangle's own plane to the flat sheet."""
     return np.einsum("tkd,tgk->tdg", plane[triangles], grad)
 
 
-def energy(jac, area):
+def energy(jac: np.ndarray, area: np.ndarray) -> float:
+    """The symmetric Dirichlet energy, infinite when a triangle is folded."""
     det = np.linalg.det(jac)
     if (det <= 0).any():
         return np.inf
@@ -40,7 +42,8 @@ def energy(jac, area):
     return float((area * norm * (1.0 + 1.0 / det**2)).sum())
 
 
-def symmetric_dirichlet(corners, plane, triangles, on_axis, rounds=80):
+def symmetric_dirichlet(corners: np.ndarray, plane: np.ndarray, triangles: np.ndarray,
+                        on_axis: np.ndarray, rounds: int = 80) -> np.ndarray:
     """Flat places of the vertices, starting from `plane`, which must not be folded.
 
     `corners` (n, 3, 3) are the corner positions of each triangle in space, whose shape the flat

@@ -2,7 +2,7 @@
 # SPDX-License-Identifier: MIT
 """Rebuilds the face model in data/ from the measured figures: python3 tools/face_model/generate.py
 
-The result is the same, bit for bit, in every run. See docs/face-model.md.
+The result is the same bits with every BLAS and processor. See docs/face-model.md.
 """
 
 import argparse
@@ -23,14 +23,15 @@ import writer
 from arithmetic import settled
 
 
-def build():
+def build() -> dict:
+    """The parts of the model by name, in the numbering of the files and the upright frame."""
     data = nostril.with_nostrils(measurements.load())
     dom = domain.build(data)
     half = topology.half_mesh(dom)
-    mesh = topology.mirrored(half.flat, half.triangles, half.middle)
+    mesh = topology.mirrored(half)
     lifted = surface.lift(data, dom, mesh)
     half = topology.refined(half, lifted)
-    mesh = topology.mirrored(half.flat, half.triangles, half.middle)
+    mesh = topology.mirrored(half)
     lifted = surface.lift(data, dom, mesh)
     mean, identity, expression = surface.modes(data, mesh, lifted)
     mean = settled(mean, 5, doubt=1e-10, nudge=-1e-9 * np.sign(mean))  # both sides alike

@@ -22,7 +22,7 @@ class Measurements:
     mirror: np.ndarray  # (n,) id of the mirrored point, its own on the middle line
     identity: np.ndarray  # (16, n, 3) for one standard deviation
     expression: np.ndarray  # (20, n, 3) at full intensity
-    expression_names: list
+    expression_names: list[str]
     measured: np.ndarray  # (n,) False for points of our own
 
 
@@ -34,15 +34,15 @@ def _modes(path):
     return names, values.reshape(len(values), len(names), 3).transpose(1, 0, 2).copy()
 
 
-def load():
+def load() -> Measurements:
+    """The figures of data/face_statistics."""
     with open(FOLDER / "points.csv", newline="") as file:
         rows = list(csv.DictReader(file))
-    column = lambda *keys: np.array([[float(row[key]) for key in keys] for row in rows])
     _, identity = _modes(FOLDER / "identity_modes.csv")
     names, expression = _modes(FOLDER / "expression_modes.csv")
     return Measurements(
-        points=column("x", "y", "z"),
-        normals=column("nx", "ny", "nz"),
+        points=np.array([[float(row[key]) for key in ("x", "y", "z")] for row in rows]),
+        normals=np.array([[float(row[key]) for key in ("nx", "ny", "nz")] for row in rows]),
         region=np.array([row["region"] for row in rows]),
         landmark=np.array([int(row["landmark"] or -1) for row in rows]),
         mirror=np.array([int(row["mirror"]) for row in rows]),

@@ -9,6 +9,8 @@ from dataclasses import replace
 
 import numpy as np
 
+from measurements import Measurements
+
 LEFT_OUT = (275, 276, 285, 297, 303)  # at image left; their mirror images go with them
 
 # Round the rim from its front end over the wing and the sill back along the septum: measured
@@ -39,13 +41,13 @@ def _own_points(points):
     return np.vstack([places, ring, middle + DEPTH * INWARDS]), len(places)
 
 
-def rim_ids(data):
+def rim_ids(data: Measurements) -> list[int]:
     """Numbers of the points round the rim at image left, in order."""
     own = iter(np.flatnonzero(data.region == "nostril_rim"))
     return [p if isinstance(p, int) else int(next(own)) for p in RIM]
 
 
-def with_nostrils(data):
+def with_nostrils(data: Measurements) -> Measurements:
     """The measurements with the points of the nostrils appended, image left first.
 
     The new points have no normals and no modes (zero); `measured` tells them apart.
@@ -55,7 +57,10 @@ def with_nostrils(data):
     points = np.vstack([left, left * [-1.0, 1.0, 1.0]])
     region = np.array(["nostril_rim"] * on_rim + ["nostril_hollow"] * (count - on_rim))
     hidden = np.isin(np.arange(old), LEFT_OUT + tuple(data.mirror[list(LEFT_OUT)]))
-    blank = lambda modes: np.concatenate([modes, np.zeros((len(modes), 2 * count, 3))], axis=1)
+
+    def padded(modes):
+        return np.concatenate([modes, np.zeros((len(modes), 2 * count, 3))], axis=1)
+
     return replace(
         data,
         points=np.vstack([data.points, points]),
@@ -64,7 +69,7 @@ def with_nostrils(data):
         landmark=np.concatenate([data.landmark, np.full(2 * count, -1)]),
         mirror=np.concatenate(
             [data.mirror, old + count + np.arange(count), old + np.arange(count)]),
-        identity=blank(data.identity),
-        expression=blank(data.expression),
+        identity=padded(data.identity),
+        expression=padded(data.expression),
         measured=np.concatenate([np.ones(old, bool), np.zeros(2 * count, bool)]),
     )

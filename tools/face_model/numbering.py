@@ -6,6 +6,8 @@ from scipy.optimize import linear_sum_assignment
 
 import tables
 from arithmetic import length
+from measurements import Measurements
+from topology import HalfMesh, Mesh
 from triangulate import edge_owners
 
 
@@ -15,7 +17,8 @@ def _apex(owners, triangles, edge, other_than):
     return next(v for v in tips if v != other_than)
 
 
-def known_vertices(data, half, mesh, owners):
+def known_vertices(data: Measurements, half: HalfMesh, mesh: Mesh,
+                   owners: dict[tuple[int, int], list[int]]) -> dict[int, int]:
     """Fixed number -> mesh vertex, before the rest is numbered."""
     known = {}
     for landmark, number in tables.landmark_vertices().items():
@@ -48,7 +51,8 @@ def _pair(mesh, mean, owners, taken, near):
     return {5: best[1], 7: best[2], 6: best[3], 8: best[4]}
 
 
-def number(data, half, mesh, mean, candidates):
+def number(data: Measurements, half: HalfMesh, mesh: Mesh, mean: np.ndarray,
+           candidates: list[int]) -> tuple[np.ndarray, np.ndarray]:
     """Returns (order, triangles): mesh vertex of each number, and the renumbered triangle list."""
     owners = edge_owners(mesh.triangles)
     known = known_vertices(data, half, mesh, owners)
@@ -82,12 +86,13 @@ def number(data, half, mesh, mean, candidates):
     return order, _triangle_order(place[mesh.triangles])
 
 
+# Fixed: part of the format of the triangle table.
 FIRST_ROWS = [(0, 2, 1), (1, 3, 0), (4, 3, 1), (4, 1, 2), (5, 7, 6), (8, 6, 7), (0, 3, 9),
               (9, 3, 10)]
 
 
 def _triangle_order(triangles):
-    """The given first rows, then by smallest vertex number, which leads each row."""
+    """The fixed first rows, then by smallest vertex number, which leads each row."""
     turned = set()
     for t in triangles.tolist():
         k = t.index(min(t))

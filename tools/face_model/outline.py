@@ -7,6 +7,8 @@ keeps telling about the nod of the head; on an even mesh it would slide along th
 nothing. Two further rows lie between each two, so that no part of an outline is far from a vertex.
 """
 
+from collections.abc import Callable
+
 import numpy as np
 
 from arithmetic import dot, length
@@ -53,7 +55,7 @@ def _lines(flat_of, place_of):
     return out
 
 
-def rows(flat_of, place_of):
+def rows(flat_of: Callable, place_of: Callable) -> list[tuple[float, np.ndarray]]:
     """Vertices along the rows as (row, flat place), the landmarks themselves left out.
 
     `flat_of` maps places in space to flat ones, `place_of` gives a landmark's flat place.
@@ -72,7 +74,8 @@ def rows(flat_of, place_of):
     return out
 
 
-def border_stops(flat_of, place_of, border):
+def border_stops(flat_of: Callable, place_of: Callable,
+                 border: np.ndarray) -> list[tuple[float, float]]:
     """Where the rows before the ear, carried on, meet the border: (row, length along it)."""
     along = np.concatenate([[0.0], np.cumsum(length(np.diff(border, axis=0)))])
     out = []

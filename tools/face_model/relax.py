@@ -1,12 +1,21 @@
 # SPDX-License-Identifier: MIT
 """Spreads mesh vertices so that the edges get the lengths wanted for them."""
 
+from __future__ import annotations
+
+from collections.abc import Callable
+from typing import TYPE_CHECKING
+
 import numpy as np
 from scipy.spatial import Delaunay, cKDTree
 
 import fields
 from arithmetic import length
+from surface import Surface
 from triangulate import flip_by_shape, signed_areas
+
+if TYPE_CHECKING:
+    from topology import HalfMesh
 
 WALL_DISTANCE = 0.6  # of the wanted edge length, between free vertices and edges that stay
 STRETCH = 1.17  # springs a little too long for the room push the vertices evenly apart
@@ -38,7 +47,8 @@ def _off_the_wall(places, wall, tree, sizing):
     return np.where(close[:, None], wall[nearest] + away * scale[:, None], places)
 
 
-def spread(places, count_fixed, sizing, inside, wall, rounds=400):
+def spread(places: np.ndarray, count_fixed: int, sizing: Callable, inside: Callable,
+           wall: np.ndarray, rounds: int = 400) -> np.ndarray:
     """Flat places, the first `count_fixed` of them immovable (Persson and Strang's scheme)."""
     tree = cKDTree(wall)
     for step in range(rounds):
@@ -55,7 +65,8 @@ def spread(places, count_fixed, sizing, inside, wall, rounds=400):
     return places
 
 
-def spread_on_surface(half, surface, rounds=160, flip_every=8):
+def spread_on_surface(half: HalfMesh, surface: Surface, rounds: int = 160,
+                      flip_every: int = 8) -> tuple[np.ndarray, np.ndarray]:
     """Flat places and triangles of the half mesh, with lengths and angles measured in space.
 
     No triangle is ever turned over on the flat face.

@@ -1,12 +1,14 @@
 # SPDX-License-Identifier: MIT
 """Draws triangle meshes to pictures with a depth buffer; nothing but numpy and Pillow."""
 
+from pathlib import Path
+
 import numpy as np
 
 LIGHT = np.array([-0.35, 0.45, 0.82])
 
 
-def turned(points, yaw=0.0, pitch=0.0):
+def turned(points: np.ndarray, yaw: float = 0.0, pitch: float = 0.0) -> np.ndarray:
     """The head turned by yaw (positive: towards the image right) and pitch (up), degrees."""
     y, p = np.radians([yaw, pitch])
     about_y = np.array([[np.cos(y), 0, np.sin(y)], [0, 1, 0], [-np.sin(y), 0, np.cos(y)]])
@@ -14,7 +16,7 @@ def turned(points, yaw=0.0, pitch=0.0):
     return points @ (about_x @ about_y).T
 
 
-def vertex_normals(points, triangles):
+def vertex_normals(points: np.ndarray, triangles: np.ndarray) -> np.ndarray:
     a, b, c = (points[triangles[:, k]] for k in range(3))
     face = np.cross(b - a, c - a)
     normals = np.zeros_like(points)
@@ -23,8 +25,9 @@ def vertex_normals(points, triangles):
     return normals / np.maximum(np.linalg.norm(normals, axis=1), 1e-12)[:, None]
 
 
-def draw(points, triangles, size=600, span=215.0, centre=(0.0, -5.0), wires=False, colours=None,
-         shade=True, sampling=2):
+def draw(points: np.ndarray, triangles: np.ndarray, size: int = 600, span: float = 215.0,
+         centre: tuple[float, float] = (0.0, -5.0), wires: bool = False,
+         colours: np.ndarray | None = None, shade: bool = True, sampling: int = 2) -> np.ndarray:
     """An RGB picture (size, size, 3) of the mesh seen from the front by parallel rays."""
     n = size * sampling
     scale = n / span
@@ -75,12 +78,12 @@ def draw(points, triangles, size=600, span=215.0, centre=(0.0, -5.0), wires=Fals
     return np.clip(small + 0.5, 0, 255).astype(np.uint8)
 
 
-def row(pictures):
+def row(pictures: list[np.ndarray]) -> np.ndarray:
     return np.concatenate(pictures, axis=1)
 
 
-def save(path, picture, colours=None):
-    from PIL import Image
+def save(path: Path, picture: np.ndarray, colours: int | None = None):
+    from PIL import Image  # the generator uses this module without drawing
     image = Image.fromarray(picture)
     if colours:
         image = image.quantize(colours, dither=Image.Dither.NONE)

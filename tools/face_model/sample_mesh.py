@@ -8,6 +8,7 @@ import numpy as np
 
 from arithmetic import length
 from flatten import symmetric_dirichlet
+from measurements import Measurements
 from nostril import rim_ids
 from triangulate import flip_by_shape, signed_areas, with_edges
 
@@ -30,7 +31,7 @@ def _project(points):
     return PLANE_SCALE * np.column_stack([angle * np.cos(turn), angle * np.sin(turn)])
 
 
-def build(data):
+def build(data: Measurements) -> tuple[np.ndarray, np.ndarray, np.ndarray]:
     """Returns (ids, flat, triangles) of the half: point ids, flat places in mm, triangles."""
     ids = np.flatnonzero(
         (data.points[:, 0] < 1e-6) & ~np.isin(data.region, ("pupil", "left_out")))

@@ -2,6 +2,7 @@
 """The model in data/, read back for the checker, the artists' files and the pictures."""
 
 import re
+from pathlib import Path
 
 import numpy as np
 
@@ -11,7 +12,7 @@ import writer
 class Model:
     """The files of data/, back in the upright head frame and in standard deviations."""
 
-    def __init__(self, folder):
+    def __init__(self, folder: Path):
         raw = writer.read_model(folder / "face_model.bin")
         untilt = np.linalg.inv(writer.TILT)
         self.mean, identity, self.expression = (block @ untilt.T for block in raw[:3])

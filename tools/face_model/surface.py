@@ -1,13 +1,21 @@
 # SPDX-License-Identifier: MIT
 """Lifts the flat mesh to the smooth surface through the measured points, with its modes."""
 
+from __future__ import annotations
+
 from dataclasses import dataclass
+from typing import TYPE_CHECKING
 
 import numpy as np
 import scipy.sparse as sp
 
 import fields
 from arithmetic import length
+from measurements import Measurements
+
+if TYPE_CHECKING:
+    from domain import Domain
+    from topology import Mesh
 
 POINT_WEIGHT = 1e3
 NORMAL_WEIGHT = 4.0
@@ -23,7 +31,8 @@ class Samples:
     flat: np.ndarray
 
 
-def samples(data, dom):
+def samples(data: Measurements, dom: Domain) -> Samples:
+    """The points of the half and their mirror images."""
     ids, flat = list(dom.ids), list(dom.flat)
     for k, point in enumerate(dom.ids):
         if data.mirror[point] != point:
@@ -56,12 +65,13 @@ class Surface:
     flat: np.ndarray
     triangles: np.ndarray
     points: np.ndarray
-    quadratic: object  # bending form on the surface
-    matrix: object  # values at the measured points from vertex values
+    quadratic: sp.spmatrix  # bending form on the surface
+    matrix: sp.spmatrix  # values at the measured points from vertex values
     ids: np.ndarray
 
 
-def lift(data, dom, mesh, normal_weight=NORMAL_WEIGHT):
+def lift(data: Measurements, dom: Domain, mesh: Mesh) -> Surface:
+    """The smooth surface through the measured points."""
     known = samples(data, dom)
     flat, triangles = fields.subdivided(mesh.flat, mesh.triangles)
     anchors = fields.locate(flat, triangles, known.flat)
@@ -78,24 +88,25 @@ def lift(data, dom, mesh, normal_weight=NORMAL_WEIGHT):
         slopes = _slopes(points, triangles, anchors.part(slope_known),
                          data.normals[known.ids[slope_known]])
         points = fields.surface_through(
-            quadratic, matrix, places, weights, slopes, normal_weight)
+            quadratic, matrix, places, weights, slopes, NORMAL_WEIGHT)
     measured = data.measured[known.ids]
     return Surface(flat, triangles, points, fields.bending(points, triangles), matrix[measured],
                    known.ids[measured])
 
 
-def mirror_field(field, mesh):
+def mirror_field(field: np.ndarray, mesh: Mesh) -> np.ndarray:
+    """The mirror image of displacements or places (n, 3)."""
     return field[mesh.mirror] * [-1.0, 1.0, 1.0]
 
 
-def partner(name, names):
+def partner(name: str, names: list[str]) -> tuple[int, float]:
     """Number of the mirrored expression and the sign it comes with."""
     if name[-2:] in ("_L", "_R"):
         return names.index(name[:-1] + {"L": "R", "R": "L"}[name[-1]]), 1.0
     return names.index(name), -1.0 if name.endswith("_side") else 1.0
 
 
-def symmetric(fields_of, names, mesh):
+def symmetric(fields_of: np.ndarray, names: list[str], mesh: Mesh) -> np.ndarray:
     """Expression fields (..., n, 3) by number, made exact mirror images of their partners."""
     out = []
     for k, name in enumerate(names):
@@ -104,7 +115,8 @@ def symmetric(fields_of, names, mesh):
     return np.array(out)
 
 
-def modes(data, mesh, surface):
+def modes(data: Measurements, mesh: Mesh,
+          surface: Surface) -> tuple[np.ndarray, np.ndarray, np.ndarray]:
     """Mean (n, 3), identity modes (16, n, 3), expressions (20, n, 3): exactly symmetric."""
     count = len(mesh.flat)
     every = np.concatenate([data.identity, data.expression])

@@ -1,5 +1,5 @@
 # SPDX-License-Identifier: MIT
-"""The tables of data/ that tie vertices to landmarks; they are given, not generated."""
+"""The tables of data/ that tie vertices to landmarks. They are fixed: part of the file format."""
 
 import re
 
@@ -13,15 +13,15 @@ def _read(name):
     return np.array([int(number) for number in re.findall(r"\d+", text)])
 
 
-def default_contour():
+def default_contour() -> np.ndarray:
     return _read("default_contour_vertex_indices.inc")
 
 
-def inner_landmarks():
+def inner_landmarks() -> np.ndarray:
     return _read("inner_landmark_vertex_indices.inc")
 
 
-def contour_candidates():
+def contour_candidates() -> np.ndarray:
     return _read("contour_candidate_vertex_indices.inc")
 
 
@@ -30,7 +30,7 @@ LID_MIDDLE = 1154
 RIDGE = {97: 1335, 98: 1366, 99: 1443, 100: 1513}
 
 
-def landmark_vertices():
+def landmark_vertices() -> dict[int, int]:
     """Vertex of each landmark that has one: 0..94 and the ridge 97..100."""
     table = dict(enumerate(np.concatenate([default_contour(), inner_landmarks()]).tolist()))
     table.update(RIDGE)

@@ -42,7 +42,8 @@ def _gradient_operator(points, triangles):
         0.5 * double
 
 
-def lid_contacts(face, upper, lower):
+def lid_contacts(face: np.ndarray, upper: list[int],
+                 lower: list[int]) -> list[tuple[int, int, int, float]]:
     """For each upper rim vertex the place on the lower rim where it rests.
 
     As (vertex, two vertices of the lower rim, share of the way between them).
@@ -63,7 +64,7 @@ def lid_contacts(face, upper, lower):
 class Transfer:
     """Carries expressions from one face of a mesh to another."""
 
-    def __init__(self, triangles):
+    def __init__(self, triangles: np.ndarray):
         self.triangles = triangles
 
     def _system(self, points, move):
@@ -83,14 +84,15 @@ class Transfer:
         rest = np.linalg.inv(_frames(points, self.triangles))
         return _frames(points + move, self.triangles) @ rest - np.eye(3)
 
-    def displacement(self, mean, move, face):
+    def displacement(self, mean: np.ndarray, move: np.ndarray, face: np.ndarray) -> np.ndarray:
         """The expression's whole displacement on another face."""
         operator, weighted, system = self._system(face, move)
         slope = (operator @ face).reshape(-1, 3, 3)
         wanted = np.einsum("tcd,tgd->tgc", self._change(mean, move), slope).reshape(-1, 3)
         return Solver(system)(weighted @ wanted)
 
-    def first_order(self, mean, move, identity, contacts):
+    def first_order(self, mean: np.ndarray, move: np.ndarray, identity: np.ndarray,
+                    contacts: list[tuple[int, int, int, float]]) -> np.ndarray:
         """Change of the displacement for one unit of each identity mode."""
         operator, weighted, system = self._system(mean, move)
         change = self._change(mean, move)
@@ -110,7 +112,8 @@ class Transfer:
         return np.array(out)
 
 
-def build(mean, identity, expression, names, triangles, lids):
+def build(mean: np.ndarray, identity: np.ndarray, expression: np.ndarray, names: list[str],
+          triangles: np.ndarray, lids: dict[str, tuple[list, list]]) -> np.ndarray:
     """Blocks T (identity, expression, n, 3) in mm for one unit of each.
 
     `lids` gives for each blink's name the upper and the lower rim's vertices, corner to corner.
@@ -123,7 +126,7 @@ def build(mean, identity, expression, names, triangles, lids):
     return np.array(blocks).transpose(1, 0, 2, 3)
 
 
-def steps(blocks):
+def steps(blocks: np.ndarray) -> np.ndarray:
     """The blocks in the file's 8-bit steps, those that the engine does not read left empty."""
     values = np.rint(blocks * writer.FIXED_POINT / writer.TENSOR_STEP)
     values = values * read_pairs(*blocks.shape[:2])[:, :, None, None]
@@ -132,13 +135,13 @@ def steps(blocks):
     return values.astype(np.int8)
 
 
-def read_pairs(identities=16, expressions=20):
+def read_pairs(identities: int = 16, expressions: int = 20) -> np.ndarray:
     """Marks the blocks the engine reads: even sums, and the whole row of the last identity."""
     k, j = np.indices((identities, expressions))
     return ((k + j) % 2 == 0) | (k == identities - 1)
 
 
-def expression_order(tensor, names):
+def expression_order(tensor: np.ndarray, names: list[str]) -> np.ndarray:
     """An order of the expressions in which the blocks that are read hold the most.
 
     Left and right partners get places of the same parity, so that both sides are treated alike;

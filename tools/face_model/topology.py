@@ -5,14 +5,17 @@ The counts are fixed: 1812 vertices and 3456 triangles with the two eyes and the
 172 edges on the boundary, 86 a half.
 """
 
-from dataclasses import dataclass, replace
+from collections.abc import Callable
+from dataclasses import dataclass, field, replace
 
 import numpy as np
 from scipy.spatial import cKDTree
 
-import domain as domain_module
 from arithmetic import length, settled
+from domain import BORDER_EDGES, CURVE_STEPS, Domain
 from relax import spread, spread_on_surface
+from sample_mesh import EYE_RING, MOUTH_RING
+from surface import Surface
 from triangulate import with_edges
 
 VERTICES, TRIANGLES, BOUNDARY_EDGES = 1812, 3456, 172
@@ -29,6 +32,8 @@ NOSE_POINTS = [66, 67, 68, 100, 120, 109, 104, 298, 307, 311, 314, 308, 295, 299
 BROW_POINTS = list(range(19, 29))
 LEAST_DISTANCE = 3.6  # mm between the vertices along outlines and other fixed ones
 LID_RING = 24  # vertices round the eye; they come first
+# Neighbours in the mouth's ring that are far apart.
+WIDE_MOUTH_STEPS = {(88, 364), (364, 87), (87, 365)}
 INNER_POINTS = (list(range(0, 9)) + list(range(19, 29))
                 + [63, 64, 65, 66, 67, 68, 75, 76, 77, 85, 86])
 
@@ -41,14 +46,14 @@ class HalfMesh:
     triangles: np.ndarray
     middle: np.ndarray  # vertices on the middle line
     fixed: np.ndarray  # vertices that keep their place
-    named: dict  # measured point -> vertex
-    patch: dict  # 0..4 -> vertex
+    named: dict[int, int]  # measured point -> vertex
+    patch: dict[int, int]  # 0..4 -> vertex
     lid_middle: int  # the vertex above the pupil on the upper lid's rim
-    border: list  # vertices along the outer border, top to bottom
-    keep: frozenset  # edges that stay
+    border: list[int]  # vertices along the outer border, top to bottom
+    keep: frozenset[tuple[int, int]]  # edges that stay
     wall: np.ndarray  # dense places along them
-    sizing: object  # wanted edge length at a flat place
-    rows: list  # (row, vertex) of the vertices along outlines
+    sizing: Callable[[np.ndarray], np.ndarray]  # wanted edge lengths at flat places
+    rows: list[tuple]  # (row, vertex) of the vertices along outlines
 
 
 def _spaced(line, count, weight=None):
@@ -70,7 +75,7 @@ def _border_places(dom):
     line = dom.border
     along = np.concatenate([[0.0], np.cumsum(length(np.diff(line, axis=0)))])
     stops = [along_border for _, along_border in dom.stops]
-    rest = domain_module.BORDER_EDGES - (len(stops) - 1)
+    rest = BORDER_EDGES - (len(stops) - 1)
     above = int(round(rest * stops[0] / (stops[0] + along[-1] - stops[-1])))
     places = np.concatenate([np.linspace(0.0, stops[0], above + 1)[:-1], stops,
                              np.linspace(stops[-1], along[-1], rest - above + 1)[1:]])
@@ -81,17 +86,19 @@ def _border_places(dom):
 class Sizing:
     """Wanted edge length at a flat place."""
 
-    def __init__(self, dom):
-        point = lambda ids: np.array([dom.place(p) for p in ids])
+    def __init__(self, dom: Domain):
+        def points(ids):
+            return np.array([dom.place(p) for p in ids])
+
         self.trees = {
             "eye": cKDTree(dom.eye),
-            "lips": cKDTree(np.concatenate([dom.mouth, point(LIP_LINE)])),
-            "nose": cKDTree(point(NOSE_POINTS)),
-            "brow": cKDTree(point(BROW_POINTS)),
+            "lips": cKDTree(np.concatenate([dom.mouth, points(LIP_LINE)])),
+            "nose": cKDTree(points(NOSE_POINTS)),
+            "brow": cKDTree(points(BROW_POINTS)),
         }
         self.patch = cKDTree(np.array([dom.patch[k] for k in range(5)]))
 
-    def __call__(self, places):
+    def __call__(self, places: np.ndarray) -> np.ndarray:
         size = np.full(len(places), np.inf)
         for name, (start, growth) in GROWTH.items():
             size = np.minimum(size, start + growth * self.trees[name].query(places)[0])
@@ -116,69 +123,86 @@ def _inside(polygon, places):
     return inside
 
 
-def _boundary(dom, sizing):
-    """Fixed places and the edges that join them, as (places, edges, bookkeeping)."""
-    places, edges, named = [], [], {}
+@dataclass
+class _Frame:
+    """The vertices that keep their places and the edges between them, as they are laid out."""
 
-    def add(place, point=None):
+    places: list[np.ndarray] = field(default_factory=list)
+    edges: list[tuple[int, int]] = field(default_factory=list)
+    named: dict[int, int] = field(default_factory=dict)  # measured point -> vertex
+    rows: list[tuple] = field(default_factory=list)  # (row, vertex) of those along outlines
+    lid_middle: int = -1  # the vertex above the pupil on the upper lid's rim
+    mouth: list[int] = field(default_factory=list)  # along the rims of the lips
+    outer: list[int] = field(default_factory=list)  # along the border, top to bottom
+    middle: list[int] = field(default_factory=list)  # along the middle line
+
+    def add(self, place, point=None):
+        """A vertex at a flat place; with `point`, the one of that measured point."""
         if point is not None:
-            named[point] = len(places)
-        places.append(place)
-        return len(places) - 1
+            self.named[point] = len(self.places)
+        self.places.append(place)
+        return len(self.places) - 1
 
-    def join(chain):
-        edges.extend(zip(chain, chain[1:]))
+    def vertex(self, dom, point):
+        """The vertex of a measured point, added if there is none."""
+        return self.named[point] if point in self.named else self.add(dom.place(point), point)
 
-    # lid ring: the twelve landmarks and one vertex between each two
-    eye_ring = domain_module.sample_mesh.EYE_RING
-    chain = []
-    for k, point in enumerate(eye_ring):
-        chain.append(add(dom.place(point), point))
-        chain.append(add(dom.eye[24 * k + 12]))
-    join(chain + chain[:1])
-    lid_middle = chain[2 * eye_ring.index(42) + 1]
+    def join(self, chain, closed=False):
+        self.edges.extend(zip(chain, chain[1:] + chain[:1] if closed else chain[1:]))
 
-    # mouth rim: the measured points, and one between where they are far apart
-    ring = domain_module.sample_mesh.MOUTH_RING
-    between = {(88, 364), (364, 87), (87, 365)}
-    mouth = []
-    for k, point in enumerate(ring):
-        mouth.append(add(dom.place(point), point))
-        if k + 1 < len(ring) and (point, ring[k + 1]) in between:
-            mouth.append(add(dom.mouth[24 * k + 12]))
-    join(mouth)
 
-    # rim of the nostril
-    rim = [add(place) for place in dom.nostril]
-    join(rim + rim[:1])
+def _add_openings(frame, dom):
+    """The rims of the eye, the mouth and the nostril."""
+    between = CURVE_STEPS // 2  # place of a curve half way between two of its points
+    # the lid ring: the twelve landmarks and one vertex between each two
+    lids = []
+    for k, point in enumerate(EYE_RING):
+        lids.append(frame.add(dom.place(point), point))
+        lids.append(frame.add(dom.eye[CURVE_STEPS * k + between]))
+    frame.join(lids, closed=True)
+    frame.lid_middle = lids[2 * EYE_RING.index(42) + 1]
 
-    # outer border
-    line = dom.border
-    border, border_rows = _border_places(dom)
-    outer = [add(p) for p in border]
-    grid = [(row, outer[k]) for k, row in border_rows.items()]
-    left = outer[int(np.argmin(np.array(places)[outer][:, 0]))]
-    places[left] = line[np.argmin(line[:, 0])]
-    join(outer)
+    # the mouth: the measured points, and one between where they are far apart
+    for k, point in enumerate(MOUTH_RING):
+        frame.mouth.append(frame.add(dom.place(point), point))
+        if tuple(MOUTH_RING[k:k + 2]) in WIDE_MOUTH_STEPS:
+            frame.mouth.append(frame.add(dom.mouth[CURVE_STEPS * k + between]))
+    frame.join(frame.mouth)
 
-    # middle line: from the border to the upper lip and from the lower lip to the border
-    def stop(point):
-        return named[point] if point in named else add(dom.place(point), point)
+    frame.join([frame.add(place) for place in dom.nostril], closed=True)
 
-    stretches = [[outer[0]] + [stop(p) for p in (97, 98, 99, 100, 78, 89)],
-                 [stop(p) for p in (93, 84, 9)] + [outer[-1]]]
-    spans = [np.array([places[v] for v in stretch]) for stretch in stretches]
-    middle = []
+
+def _add_border(frame, dom):
+    """The outer border; its leftmost vertex lies where the border is furthest out."""
+    border, rows = _border_places(dom)
+    border[np.argmin(border[:, 0])] = dom.border[np.argmin(dom.border[:, 0])]
+    frame.outer = [frame.add(place) for place in border]
+    frame.rows += [(row, frame.outer[k]) for k, row in rows.items()]
+    frame.join(frame.outer)
+
+
+def _add_middle_line(frame, dom, sizing):
+    """From the border to the upper lip, and from the lower lip to the border."""
+    stretches = [[frame.outer[0]] + [frame.vertex(dom, p) for p in (97, 98, 99, 100, 78, 89)],
+                 [frame.vertex(dom, p) for p in (93, 84, 9)] + [frame.outer[-1]]]
+    spans = [np.array([frame.places[v] for v in stretch]) for stretch in stretches]
     for stretch, marks, counts in zip(stretches, spans, _middle_counts(spans, sizing)):
         chain = []
         for k, count in enumerate(counts):
             chain.append(stretch[k])
             dense = np.linspace(marks[k], marks[k + 1], 200)
-            chain += [add(p) for p in _spaced(dense, count, sizing(dense))[1:-1]]
+            chain += [frame.add(p) for p in _spaced(dense, count, sizing(dense))[1:-1]]
         chain.append(stretch[-1])
-        join(chain)
-        middle += chain
-    return places, edges, named, lid_middle, mouth, outer, middle, grid
+        frame.join(chain)
+        frame.middle += chain
+
+
+def _frame(dom, sizing):
+    frame = _Frame()
+    _add_openings(frame, dom)
+    _add_border(frame, dom)
+    _add_middle_line(frame, dom, sizing)
+    return frame
 
 
 def _middle_counts(spans, sizing):
@@ -198,82 +222,65 @@ def _middle_counts(spans, sizing):
     return counts[:split].tolist(), counts[split:].tolist()
 
 
-def half_mesh(dom):
-    sizing = Sizing(dom)
-    places, edges, named, lid_middle, mouth, outer, middle, grid = _boundary(dom, sizing)
-    patch = {}
-    for k in range(5):
-        patch[k] = len(places)
-        places.append(dom.patch[k])
-    quad = [patch[k] for k in (0, 2, 4, 3)]
-    edges += list(zip(quad, quad[1:] + quad[:1]))
-    for point in INNER_POINTS:
-        if point not in named:
-            named[point] = len(places)
-            places.append(dom.place(point))
-    crowd = cKDTree(np.array(places))
-    for row, place in dom.rows:
-        if crowd.query(place)[0] > LEAST_DISTANCE:
-            grid.append((row, len(places)))
-            places.append(place)
-    fixed = np.array(places)
-    fixed[middle, 0] = 0.0
-
-    # the mouth is open towards the middle line: close its outline beyond it
-    lips = np.concatenate([fixed[mouth], [[1.0, fixed[mouth[-1], 1]], [1.0, fixed[mouth[0], 1]]]])
-    holes = [fixed[:LID_RING], lips, fixed[quad]]
-    outline = fixed[outer]
-
-    def inside(p):
-        ok = _inside(outline, p) & (p[:, 0] < -1e-9)
-        for hole in holes:
-            ok &= ~_inside(hole, p)
-        return ok
-
-    wall = np.concatenate([
-        fixed[a] + (fixed[b] - fixed[a]) * np.linspace(0, 1, 24)[:, None] for a, b in edges])
-    half = (VERTICES - MIDDLE_VERTICES) // 2 + MIDDLE_VERTICES
-    free = half - len(fixed)
+def _starting_places(fixed, wall, sizing, inside, count):
+    """Random places for the free vertices, as dense as wanted and off the fixed ones."""
     rng = np.random.RandomState(SEED)
-    low, high = outline.min(axis=0), outline.max(axis=0)
+    low, high = fixed.min(axis=0), fixed.max(axis=0)
     trial = low + (high - low) * rng.random_sample((60000, 2))
     size = sizing(trial)
     trial = trial[inside(trial) & (rng.random_sample(len(trial)) < (size.min() / size) ** 2)]
     trial = trial[cKDTree(np.concatenate([fixed, wall])).query(trial)[0] > 0.5 * sizing(trial)]
-    if len(trial) < free:
+    if len(trial) < count:
         raise ValueError("too few starting places")
-    places = np.concatenate([fixed, trial[:free]])
+    return trial[:count]
+
+
+def half_mesh(dom: Domain) -> HalfMesh:
+    """Vertices and triangles of the half face, spread by lengths on the flat face."""
+    sizing = Sizing(dom)
+    frame = _frame(dom, sizing)
+    patch = {k: frame.add(dom.patch[k]) for k in range(5)}
+    quad = [patch[k] for k in (0, 2, 4, 3)]  # round vertex 1
+    frame.join(quad, closed=True)
+    for point in INNER_POINTS:
+        frame.vertex(dom, point)
+    crowd = cKDTree(np.array(frame.places))
+    for row, place in dom.rows:
+        if crowd.query(place)[0] > LEAST_DISTANCE:
+            frame.rows.append((row, frame.add(place)))
+    fixed = np.array(frame.places)
+    fixed[frame.middle, 0] = 0.0
+
+    # the mouth is open towards the middle line: close its outline beyond it
+    mouth = fixed[frame.mouth]
+    lips = np.concatenate([mouth, [[1.0, mouth[-1, 1]], [1.0, mouth[0, 1]]]])
+    holes = [fixed[:LID_RING], lips, fixed[quad]]
+    outline = fixed[frame.outer]
+
+    def inside(places):
+        ok = _inside(outline, places) & (places[:, 0] < -1e-9)
+        for hole in holes:
+            ok &= ~_inside(hole, places)
+        return ok
+
+    wall = np.concatenate([fixed[a] + (fixed[b] - fixed[a]) * np.linspace(0, 1, 24)[:, None]
+                           for a, b in frame.edges])
+    half = (VERTICES - MIDDLE_VERTICES) // 2 + MIDDLE_VERTICES
+    free = _starting_places(fixed, wall, sizing, inside, half - len(fixed))
+    # Up to here every bit is certain. Fixed places may lie half way between decimals.
+    places = np.concatenate([fixed, free])
     places = np.round(spread(places, len(fixed), sizing, inside, wall), 5)
 
-    triangles = with_edges(places, edges)
+    triangles = with_edges(places, frame.edges)
     triangles = triangles[inside(places[triangles].mean(axis=1))]
     fan = [(patch[0], patch[2], patch[1]), (patch[1], patch[3], patch[0]),
            (patch[4], patch[3], patch[1]), (patch[4], patch[1], patch[2])]
     triangles = np.concatenate([triangles, fan])
     spokes = [(patch[1], patch[k]) for k in (0, 2, 3, 4)]
-    stay = frozenset((min(e), max(e)) for e in edges + spokes)
-    return HalfMesh(places, triangles, np.array(sorted(middle)), np.arange(len(fixed)), named,
-                    patch, lid_middle, outer, stay, wall, sizing, grid)
-
-
-def lid_rims(half, mesh):
-    """Upper and lower lid rim of the eye at image left and of that at image right.
-
-    The rims run between the corners; the lower one holds the corners too.
-    """
-    corner = half.named[45]  # the inner one; the ring starts at the outer one
-    upper = list(range(half.named[39] + 1, corner))
-    lower = [half.named[39]] + list(range(LID_RING - 1, corner - 1, -1))
-    image = lambda chain: [int(mesh.mirror[v]) for v in chain]
-    return (upper, lower), (image(upper), image(lower))
-
-
-def refined(half, surface):
-    """The half mesh spread anew with the lengths it has on the lifted surface."""
-    flat, triangles = spread_on_surface(half, surface)
-    # Vertices that rest half way between two places on a wall are half way between decimals, too.
-    flat = settled(flat, 5, doubt=1e-10, nudge=-1e-9)
-    return replace(half, flat=flat, triangles=triangles)
+    keep = frozenset((min(e), max(e)) for e in frame.edges + spokes)
+    return HalfMesh(places, triangles, np.array(sorted(frame.middle)), np.arange(len(fixed)),
+                    frame.named, patch, frame.lid_middle, frame.outer, keep, wall, sizing,
+                    frame.rows)
 
 
 @dataclass
@@ -285,11 +292,31 @@ class Mesh:
     mirror: np.ndarray  # mirrored vertex of each vertex
 
 
-def mirrored(flat, triangles, middle):
+def mirrored(half: HalfMesh) -> Mesh:
+    flat, triangles = half.flat, half.triangles
     count = len(flat)
-    side = np.setdiff1d(np.arange(count), middle)
+    side = np.setdiff1d(np.arange(count), half.middle)
     image = np.arange(count)
     image[side] = count + np.arange(len(side))
     mirror = np.concatenate([image, side])
     whole = np.concatenate([flat, flat[side] * [-1.0, 1.0]])
     return Mesh(whole, np.concatenate([triangles, image[triangles][:, ::-1]]), mirror)
+
+
+def lid_rims(half: HalfMesh, mesh: Mesh) -> tuple[tuple, tuple]:
+    """Upper and lower lid rim of the eye at image left and of that at image right.
+
+    The rims run between the corners; the lower one holds the corners too.
+    """
+    corner = half.named[45]  # the inner one; the ring starts at the outer one
+    upper = list(range(half.named[39] + 1, corner))
+    lower = [half.named[39]] + list(range(LID_RING - 1, corner - 1, -1))
+    return (upper, lower), (mesh.mirror[upper].tolist(), mesh.mirror[lower].tolist())
+
+
+def refined(half: HalfMesh, surface: Surface) -> HalfMesh:
+    """The half mesh spread anew with the lengths it has on the lifted surface."""
+    flat, triangles = spread_on_surface(half, surface)
+    # Vertices that rest half way between two places on a wall are half way between decimals, too.
+    flat = settled(flat, 5, doubt=1e-10, nudge=-1e-9)
+    return replace(half, flat=flat, triangles=triangles)

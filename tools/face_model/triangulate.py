@@ -9,12 +9,13 @@ from scipy.spatial import Delaunay
 from arithmetic import dot, length
 
 
-def signed_areas(plane, triangles):
+def signed_areas(plane: np.ndarray, triangles: np.ndarray) -> np.ndarray:
+    """Areas of triangles in the plane, positive when counter-clockwise."""
     a, b, c = (plane[triangles[:, k]] for k in range(3))
     return 0.5 * ((b - a)[:, 0] * (c - a)[:, 1] - (b - a)[:, 1] * (c - a)[:, 0])
 
 
-def edge_owners(triangles):
+def edge_owners(triangles: np.ndarray) -> dict[tuple[int, int], list[int]]:
     """Undirected edge -> list of the triangles beside it."""
     owners = {}
     for index, t in enumerate(np.asarray(triangles).tolist()):
@@ -24,14 +25,14 @@ def edge_owners(triangles):
     return owners
 
 
-def boundary_edges(triangles):
+def boundary_edges(triangles: np.ndarray) -> list[tuple[int, int]]:
     """Directed edges (a, b) with the surface on their left."""
     t = np.asarray(triangles)
     directed = {(int(a), int(b)) for k in range(3) for a, b in t[:, [k, (k + 1) % 3]]}
     return sorted(e for e in directed if (e[1], e[0]) not in directed)
 
 
-def boundary_rings(triangles):
+def boundary_rings(triangles: np.ndarray) -> list[list[int]]:
     """The closed rings of vertices that the boundary edges make."""
     after = dict(boundary_edges(triangles))
     rings = []
@@ -61,7 +62,7 @@ def _flip(t, u, edge):
     return (apex, left, other), (apex, other, right)
 
 
-def with_edges(plane, edges):
+def with_edges(plane: np.ndarray, edges: list[tuple[int, int]]) -> np.ndarray:
     """Triangles (counter-clockwise) over all points that contain every edge of `edges`."""
     triangles = Delaunay(plane).simplices
     turned = signed_areas(plane, triangles) < 0

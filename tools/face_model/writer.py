@@ -1,6 +1,8 @@
 # SPDX-License-Identifier: MIT
 """Writes the model file and the tables of data/."""
 
+from pathlib import Path
+
 import numpy as np
 
 from arithmetic import dot
@@ -21,16 +23,17 @@ def tilted(vectors: np.ndarray) -> np.ndarray:
     return np.stack([dot(vectors, row) for row in TILT], axis=-1)
 
 
-def fixed(vectors, kind="<i2"):
+def fixed(vectors: np.ndarray) -> np.ndarray:
     """16-bit fixed point; raises when a value does not fit."""
     values = np.rint(vectors * FIXED_POINT)
     limit = np.iinfo(np.int16)
     if values.min() < limit.min or values.max() > limit.max:
         raise ValueError("a coordinate does not fit 16 bits")
-    return values.astype(kind)
+    return values.astype("<i2")
 
 
-def write_model(path, mean, identity, expression, tensor):
+def write_model(path: Path, mean: np.ndarray, identity: np.ndarray, expression: np.ndarray,
+                tensor: np.ndarray):
     """Shapes: (n, 3), (16, n, 3), (20, n, 3) in mm in the file's frame; tensor int8 steps."""
     with open(path, "wb") as file:
         file.write(np.array([len(mean), len(identity), len(expression)], "<i4").tobytes())
@@ -39,9 +42,9 @@ def write_model(path, mean, identity, expression, tensor):
         file.write(tensor.astype("<i1").tobytes())
 
 
-def read_model(path):
+def read_model(path: Path) -> tuple[np.ndarray, np.ndarray, np.ndarray, np.ndarray]:
     """The inverse of write_model, in mm and steps."""
-    raw = open(path, "rb").read()
+    raw = path.read_bytes()
     n, k, j = np.frombuffer(raw, "<i4", 3)
     values = np.frombuffer(raw, "<i2", 3 * n * (1 + k + j), 12).astype(float) / FIXED_POINT
     blocks = np.split(values, [3 * n, 3 * n * (1 + k)])
@@ -57,16 +60,16 @@ def _table(path, comment, rows, a_line):
             file.write(" ".join(rows[start:start + a_line]) + "\n")
 
 
-def write_triangles(path, triangles):
+def write_triangles(path: Path, triangles: np.ndarray):
     _table(path, "Vertices of the face mesh's triangles, counter-clockwise seen from outside.",
            [f"{{{a}, {b}, {c}}}," for a, b, c in triangles.tolist()], 6)
 
 
-def write_texture(path, texture):
+def write_texture(path: Path, texture: np.ndarray):
     _table(path, "Texture coordinates (u, v) of the face mesh's vertices, v downwards.",
            [f"{{{u:.6f}f, {v:.6f}f}}," for u, v in texture], 4)
 
 
-def write_names(path, names):
+def write_names(path: Path, names: list[str]):
     _table(path, "Names of the expressions of the face model, in the order of the model file.",
            [f'"{name}",' for name in names], 5)

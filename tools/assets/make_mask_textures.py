@@ -6,7 +6,7 @@ Everything is placed by the landmarks' vertices and measured in eye distances, s
 again after the model has changed gives masks that fit it. The layout is read from data/. Needs
 Debian's numpy, scipy and Pillow; the same bits every time.
 
-    /usr/bin/python3 tools/make_mask_textures.py [FOLDER]
+    /usr/bin/python3 tools/assets/make_mask_textures.py [--out FOLDER]
 """
 
 import argparse
@@ -19,15 +19,15 @@ from PIL import Image, ImageDraw
 from scipy import interpolate, ndimage
 from scipy.cluster import vq
 
-ROOT = Path(__file__).resolve().parent.parent
+ROOT = Path(__file__).resolve().parents[2]
 sys.path.insert(0, str(ROOT / "tools" / "face_model"))
-from measurements import DATA
-from shipped import Model
-from tables import default_contour, inner_landmarks
-from triangulate import boundary_rings
+from measurements import DATA  # noqa: E402
+from shipped import Model  # noqa: E402
+from tables import default_contour, inner_landmarks  # noqa: E402
+from triangulate import boundary_rings  # noqa: E402
 
 SIZE = 512  # of a picture; a face on a photo seldom has more pixels
-FINE = 3    # drawn that much larger, for smooth edges
+FINE = 3  # drawn that much larger, for smooth edges
 PIXELS = SIZE * FINE
 
 
@@ -352,8 +352,8 @@ def tiger(face):
     shift = noise(11, 0.0016, (5, 0.6)) * 0.012 * e
     side = noise(12, 0.0030) * 0.010 * e
     rows, columns = np.mgrid[0:PIXELS, 0:PIXELS].astype(float)
-    torn = ndimage.map_coordinates(blur(stripes, 0.0012), [rows + shift * PIXELS,
-                                                          columns + side * PIXELS], order=1)
+    torn = ndimage.map_coordinates(
+        blur(stripes, 0.0012), [rows + shift * PIXELS, columns + side * PIXELS], order=1)
     black = [0.07, 0.05, 0.05]
     p.paint(0.96 * torn, black)
 

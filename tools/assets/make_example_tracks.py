@@ -2,11 +2,15 @@
 # SPDX-License-Identifier: MIT
 """Cuts the landmark tracks of examples/tracks out of longer recordings, and examples/one_face.txt.
 
-    tools/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [--out FOLDER]
+    tools/assets/make_example_tracks.py SYNTHETIC_FOLDER REAL_FOLDER [--out FOLDER]
 
-The folders hold the whole tracks named below. A cut keeps every `step`th frame, numbers the frames
-anew from 0, rounds the truth to six digits and drops the true 3-D points. Two tracks are turned and
-mirrored as a phone's cameras would deliver them.
+The folders hold the whole tracks named below. They are not in the repository: they are longer
+recordings, of synthetic faces and of what a detector found in the pictures that THIRD_PARTY.md
+names. The script is kept to show how the examples were cut from them.
+
+A cut keeps every `step`th frame, numbers the frames anew from 0, rounds the truth to six digits and
+drops the true 3-D points. Two tracks are turned and mirrored as a phone's cameras would deliver
+them.
 """
 
 import argparse
@@ -109,7 +113,7 @@ def main():
     parser.add_argument("synthetic", type=pathlib.Path, help="folder of the whole synthetic tracks")
     parser.add_argument("real", type=pathlib.Path, help="folder of the whole real tracks")
     parser.add_argument("--out", type=pathlib.Path, help="folder to write to",
-                        default=pathlib.Path(__file__).parent.parent / "examples" / "tracks")
+                        default=pathlib.Path(__file__).resolve().parents[2] / "examples" / "tracks")
     arguments = parser.parse_args()
     folders = {"synthetic": arguments.synthetic, "real": arguments.real}
     out = arguments.out

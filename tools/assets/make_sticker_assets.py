@@ -7,7 +7,7 @@ midway between the tragions. Places on the mean face that the shapes are fitted 
 (+-32, 25, 78), nose ridge at (0, 26, 96) and (0, 15, 104), brows at y = 44 to 53 and z = 85 to 96,
 hairline at (0, 90, 82), widest head +-76, tops of the ears about (+-78, 14, -6).
 
-    tools/make_sticker_assets.py [FOLDER]
+    tools/assets/make_sticker_assets.py [--out FOLDER]
 """
 
 import argparse
@@ -51,7 +51,8 @@ class Obj:
 
     def __init__(self, name, title):
         self.name = name
-        self.lines = [f"# {title}", "# Made by tools/make_sticker_assets.py.", f"mtllib {name}.mtl"]
+        self.lines = [f"# {title}", "# Made by tools/assets/make_sticker_assets.py.",
+                      f"mtllib {name}.mtl"]
         self.materials = []
         self.count = 0
 
@@ -307,7 +308,7 @@ def hat():
 def main():
     parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
     parser.add_argument("--out", type=pathlib.Path, help="folder to write to",
-                        default=pathlib.Path(__file__).parent.parent / "examples" / "assets")
+                        default=pathlib.Path(__file__).resolve().parents[2] / "examples" / "assets")
     folder = parser.parse_args().out
     folder.mkdir(parents=True, exist_ok=True)
     for obj in (glasses(), hat()):
