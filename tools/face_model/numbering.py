@@ -26,7 +26,7 @@ def known_vertices(data: Measurements, half: HalfMesh, mesh: Mesh,
         if vertex is None:
             vertex = int(mesh.mirror[half.named[int(data.mirror[landmark])]])
         known[number] = vertex
-    known[tables.LID_MIDDLE] = half.lid_middle
+    known[tables.upper_lid_middle()] = half.lid_middle
     p = half.patch
     known.update({k: p[k] for k in range(5)})
     known[9] = _apex(owners, mesh.triangles, (p[0], p[3]), p[1])

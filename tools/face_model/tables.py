@@ -25,13 +25,13 @@ def contour_candidates() -> np.ndarray:
     return _read("contour_candidate_vertex_indices.inc")
 
 
-# Beyond the tables: upper lid's middle at image left, above landmark 48, and the nose ridge.
-LID_MIDDLE = 1154
-RIDGE = {97: 1335, 98: 1366, 99: 1443, 100: 1513}
+def upper_lid_middle() -> int:
+    """The middle of the upper lid of the eye at image left."""
+    return int(_read("lid_vertex_indices.inc")[0])
 
 
 def landmark_vertices() -> dict[int, int]:
-    """Vertex of each landmark that has one: 0..94 and the ridge 97..100."""
+    """Vertex of each landmark that has one: 0..94 and the ridge of the nose, 97..100."""
     table = dict(enumerate(np.concatenate([default_contour(), inner_landmarks()]).tolist()))
-    table.update(RIDGE)
+    table.update(enumerate(_read("ridge_vertex_indices.inc").tolist(), start=97))
     return table
