@@ -26,6 +26,13 @@ packages_of() {
       echo 'libgtest-dev           # tests'
       echo 'libgmock-dev           # matchers in tests'
       echo 'nlohmann-json3-dev     # the tests read landmark tracks'
+      echo 'python3-numpy          # the scripts that make data and assets, which a test runs'
+      echo 'python3-scipy          # their solvers, triangulation and filters'
+      echo 'python3-pil            # their pictures'
+      echo 'libblas3               # the reference BLAS, one of three that the results must not hang on'
+      echo 'liblapack3             # the reference LAPACK'
+      echo 'libatlas3-base         # the second BLAS, with its LAPACK'
+      echo 'libopenblas0-pthread   # the third BLAS, with its LAPACK'
       ;;
     check)
       echo 'clang                  # the second compiler'
