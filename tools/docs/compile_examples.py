@@ -1,9 +1,9 @@
 # SPDX-License-Identifier: MIT
-"""Compiles the C examples of the documents, as C99 and as C++17, with warnings as errors.
+"""Compiles the examples of the documents with warnings as errors: C as C99 and C++17, C++ as C++17.
 
     python3 tools/docs/compile_examples.py
 
-An example is a block marked c whose first line is a comment with its file name. Ends with status 1
+An example is a block marked c or cpp whose first line is a comment with its file name. Ends with status 1
 when one does not compile, or when a document has a block without a name.
 """
 
@@ -16,8 +16,8 @@ import tempfile
 from pathlib import Path
 
 ROOT = Path(__file__).resolve().parents[2]
-BLOCK = re.compile(r"^```c\n(.*?)^```$", re.MULTILINE | re.DOTALL)
-NAME = re.compile(r"/\* ([a-z0-9_]+\.c) \*/\n")
+BLOCK = re.compile(r"^```(?:c|cpp)\n(.*?)^```$", re.MULTILINE | re.DOTALL)
+NAME = re.compile(r"/\* (?P<c>[a-z0-9_]+\.c) \*/\n|// (?P<cpp>[a-z0-9_]+\.cpp)\n")
 FLAGS = ["-Wall", "-Wextra", "-Wshadow", "-Wconversion", "-Werror", "-pedantic"]
 LANGUAGES = [[os.environ.get("CC", "cc"), "-x", "c", "-std=c99"],
              [os.environ.get("CXX", "c++"), "-x", "c++", "-std=c++17"]]
@@ -26,7 +26,7 @@ LANGUAGES = [[os.environ.get("CC", "cc"), "-x", "c", "-std=c99"],
 def compiles(text, name, folder):
     source = Path(folder) / name
     source.write_text(text, encoding="utf-8")
-    for compiler in LANGUAGES:
+    for compiler in LANGUAGES if name.endswith(".c") else LANGUAGES[1:]:
         command = [*compiler, *FLAGS, f"-I{ROOT / 'include'}", "-c", str(source), "-o", os.devnull]
         if subprocess.run(command, check=False).returncode != 0:
             return False
@@ -43,11 +43,12 @@ def main():
                 name = NAME.match(text)
                 if name is None:
                     print(f"{document.name}: an example without a file name", file=sys.stderr)
-                elif compiles(text, name[1], folder):
+                elif compiles(text, name[name.lastgroup], folder):
                     good += 1
-                    print(f"{document.name}: {name[1]} compiles")
+                    print(f"{document.name}: {name[name.lastgroup]} compiles")
                 else:
-                    print(f"{document.name}: {name[1]} does not compile", file=sys.stderr)
+                    print(f"{document.name}: {name[name.lastgroup]} does not compile",
+                          file=sys.stderr)
     return 0 if good == total and total > 0 else 1
 
 
