@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// A sticker on one face, from landmarks to the place on the picture.
+// A sticker on one face, from landmarks to its place in the image.
 //   rigid_sticker data/face_model.bin < examples/one_face.txt
 #include <array>
 #include <cstdio>
@@ -8,8 +8,7 @@
 
 #include "norvale_3d_sticker_engine.h"
 
-// Where a sticker's point (mm on the mean head) lies on the picture: what OpenGL does with the
-// three matrices.
+// The pixel of a sticker's point (mm on the mean head): what OpenGL does with the three matrices.
 static std::array<float, 2> ToPixel(const Norvale_3DSticker_Face_Matrix& face, int width,
                                     int height, std::array<float, 4> point) {
   for (const float* matrix : {face.modelMatrix, face.viewMatrix, face.projectionMatrix}) {

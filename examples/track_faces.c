@@ -1,17 +1,17 @@
 /* SPDX-License-Identifier: MIT */
-/* Tracks faces in a sequence of landmarks and prints where each head is and how it is turned.
+/* Tracks faces in a sequence of landmarks and prints the position and yaw of each head.
  *
  *   track_faces FACE_MODEL LANDMARKS
  *
- * A host has a camera and a face detector; here a text file stands for both: width, height and
+ * A host has a camera and a face detector; here a text file replaces both: width, height and
  * landmarks per face, then for every frame the number of faces and x y of all their landmarks.
- * Works as C99. */
+ * Compiles as C99. */
 #include <math.h>
 #include <stdio.h>
 
 #include "norvale_3d_sticker_engine.h"
 
-#define MAX_LANDMARKS 165
+#define MAX_LANDMARKS N3DS_LANDMARKS_165
 
 static __tag_point points[N3DS_MAX_FACES * MAX_LANDMARKS];
 static float landmarks3d[N3DS_MAX_FACES][3 * MAX_LANDMARKS];
@@ -25,13 +25,13 @@ static int NextFrame(FILE* file, unsigned n_landmarks, unsigned* n_faces) {
   return 1;
 }
 
-/* A renderer hands the three matrices to OpenGL. Here they are read: view * model takes the head to
- * the viewer's space, in millimetres. */
+/* A renderer passes the three matrices to OpenGL. Here they are read: view * model takes points of
+ * the head to the camera's OpenGL frame, in millimetres. */
 static void PrintFace(int frame, unsigned index, const Norvale_3DSticker_Face_Matrix* face) {
   const float* m = face->modelMatrix;
   const float* v = face->viewMatrix;
   double yaw = atan2(m[8], m[10]) * 180.0 / 3.14159265358979;
-  printf("frame %d face %u: at %.0f %.0f %.0f mm, turned by %.1f degrees\n", frame, index,
+  printf("frame %d face %u: at %.0f %.0f %.0f mm, yaw %.1f degrees\n", frame, index,
          (double)(m[12] + v[12]), (double)(m[13] + v[13]), (double)(m[14] + v[14]), yaw);
 }
 
@@ -41,7 +41,7 @@ int main(int argc, char** argv) {
     return 2;
   }
   FILE* file = fopen(argv[2], "r");
-  NSVL_OFFSCREEN image = {0}; /* the engine looks at the size only */
+  NSVL_OFFSCREEN image = {0}; /* the engine reads the size only */
   unsigned n_landmarks = 0;
   if (file == NULL || fscanf(file, "%d %d %u", &image.width, &image.height, &n_landmarks) != 3 ||
       n_landmarks > MAX_LANDMARKS) {
@@ -49,12 +49,12 @@ int main(int argc, char** argv) {
     return 1;
   }
 
-  /* One engine for one camera: it remembers every face from frame to frame. */
+  /* One engine per camera: it keeps the tracks of the faces from frame to frame. */
   void* engine = Norvale_3DSticker_CreateEngine();
   MRESULT result = Norvale_3DSticker_Initialize(engine, argv[1], 0, 0);
   if (result != N3DS_OK) fprintf(stderr, "%s: cannot be loaded (%d)\n", argv[1], (int)result);
 
-  /* The 3-D landmarks go into buffers of ours. */
+  /* The 3-D landmarks are written to the host's buffers. */
   Norvale_3DSticker_Matrix_Array out = {0};
   for (int i = 0; i < N3DS_MAX_FACES; ++i) out.faces[i].landmarks3D = landmarks3d[i];
 

@@ -139,7 +139,7 @@ N3DS_API MRESULT N3DS_UnInit(void* core);
 /* Loads a face model; loading again replaces the model. The bytes are copied.
  *
  *   core  context
- *   data  a face model's bytes, format in docs/face-model.md; checked by size and header only
+ *   data  a face model's bytes, format in docs/formats.md; checked by size and header only
  *   size  number of bytes, N3DS_FACE_MODEL_BYTES
  *
  * Returns N3DS_OK, or

@@ -191,7 +191,7 @@ N3DS_API void Norvale_3DSticker_DestroyEngine(void* engine);
  * failure the engine is uninitialised. The file is checked by its size and its header only.
  *
  *   engine  handle
- *   path    face-model file: data/face_model.bin, format in docs/face-model.md
+ *   path    face-model file: data/face_model.bin, format in docs/formats.md
  *   degree  clockwise rotation that makes the delivered image upright: 0, 90, 180 or 270
  *   mirror  1 if the delivered image is mirrored (as some front cameras do), any other value if not
  *
@@ -223,7 +223,8 @@ N3DS_API MRESULT Norvale_3DSticker_Uninitialize(void* engine);
  * this header.
  *
  *   engine      handle
- *   image       descriptor of the delivered image; only width and height matter, each at least 1
+ *   image       descriptor of the delivered image; only width and height matter, each at least 1 (an
+ *               image of 1 pixel either way has no projection)
  *   nFaces      0 to N3DS_MAX_FACES; 0 ends all tracks
  *   nLandmarks  landmarks per face: N3DS_LANDMARKS_101 or N3DS_LANDMARKS_165; not looked at if
  *               nFaces is 0
@@ -271,7 +272,7 @@ N3DS_API MRESULT Norvale_3DSticker_Process_FaceMask(void* engine, NSVL_OFFSCREEN
 
 /* The library's version; needs no engine. Returns the same static record on every call.
  *
- * Not thread-safe: every call rewrites the record. Call it once before other threads use it. */
+ * Safe on any thread. The record belongs to the library and must not be written to. */
 N3DS_API const Norvale_3DSticker_Version* Norvale_3DSticker_GetVersion(void);
 
 /* The two functions below are exported under their C++ names. A C++ host declares them as such even
