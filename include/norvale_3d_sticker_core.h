@@ -97,7 +97,9 @@ N3DS_API int MMemCmp(const void* a, const void* b, size_t size);
  * Tracking core
  *
  * N3DS_Init -> N3DS_LoadFaceHouse -> per frame N3DS_Build3DFaceForVideo_* and then
- * N3DS_GetRigidMatrix (rigid) or N3DS_GetFace3DModel (mask) -> N3DS_UnInit. */
+ * N3DS_GetRigidMatrix (rigid) or N3DS_GetFace3DModel (mask) -> N3DS_UnInit.
+ *
+ * The engine interface is a layer on top, which maps landmarks to the upright image. */
 
 /* One face's landmarks in integer pixels of the upright, unmirrored image. */
 typedef struct N3DS_LANDMARK {
@@ -205,7 +207,11 @@ N3DS_API MRESULT N3DS_GetFace3DModel(void* core, N3DS_3D_MODEL* models, N3DS_RIG
 N3DS_API int32_t N3DS_Get3DLandmarkNum(void* core);
 
 /* ---------------------------------------------------------------------------------------------
- * Mask images */
+ * Mask images
+ *
+ * N3DS_WarpFaceMask needs a context that tracked the face in mask mode. The engine interface does
+ * not give its context away: its hosts draw the mesh with their renderer, or use the core interface
+ * for tracking too. */
 
 /* A mask image and its layout. If texCoords or triangles is null, the engine's own layout is used,
  * which data/face_template.png shows (texture vertex i is mesh vertex i), and the counts are
@@ -279,7 +285,8 @@ N3DS_API uint32_t YUV2RGB(uint32_t yuv);
  *
  * The quaternion is used as it is and not normalised: its squared length scales the model.
  * Residuals are weighted by landmark, where a landmark is known by its index in the arrays as
- * passed (layout in docs/coordinates.md).
+ * passed (layout in docs/coordinates.md). The tracker passes contourWeight 1, rangeWeight 1 for a
+ * closed mouth to 0.1 for an open one, and innerWeight from 0.1 to 10.
  *
  *   landmarks      pointCount pairs x, y, pixels
  *   modelPoints    pointCount triples X, Y, Z, mm

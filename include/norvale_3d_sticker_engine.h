@@ -25,7 +25,7 @@
  *
  *   delivered  image as the camera delivers it: x right, y down, integer pixels, origin at the
  *              upper left corner
- *   upright    the same image after mirroring back and turning by `degree`; the tracker and all
+ *   upright    the same image after mirroring back and rotating by `degree`; the tracker and all
  *              results refer to it
  *   camera     mm, x right, y down, z into the scene; the vertical field of view is taken to be
  *              2 atan(h / (w + h)) for an upright image of w x h pixels
@@ -95,7 +95,7 @@ enum {
   N3DS_TRIANGLE_COUNT = 3456,      /* triangles of the face model */
   N3DS_MASK_CORNER_COUNT = 10368,  /* corners of the unrolled mask mesh: 3 per triangle */
   N3DS_FACE_MODEL_BYTES = 2141796, /* size of a face-model file */
-  N3DS_FACE_CAPACITY = 10          /* entries declared in the output records */
+  N3DS_FACE_CAPACITY = 10          /* entries of the output records; N3DS_MAX_FACES are used */
 };
 
 /* Pixel format codes of the image functions; the frame calls ignore them. */
@@ -109,7 +109,7 @@ enum {
  * alone (each at least 1); they never touch the pixels, so the planes may be null. */
 typedef struct NSVL_OFFSCREEN {
   uint32_t pixelFormat; /* N3DS_FORMAT_* */
-  int32_t width;        /* pixels; frame calls: of the delivered image, before it is turned */
+  int32_t width;        /* pixels; frame calls: of the delivered image, before rotation */
   int32_t height;       /* pixels */
   uint8_t* plane[4];    /* pixel planes */
   int32_t pitch[4];     /* bytes from one row to the next, per plane */
@@ -131,7 +131,8 @@ typedef struct __tag_rect { /* NOLINT(bugprone-reserved-identifier): the interfa
 
 /* What a renderer needs for one face. */
 typedef struct Norvale_3DSticker_Face_Matrix {
-  float projectionMatrix[16]; /* perspective of the upright image, near 1 mm, far 5000 mm */
+  float projectionMatrix[16]; /* for a viewport that shows the whole upright image (its size
+                                 rounded down to even numbers); near 1 mm, far 5000 mm */
   float viewMatrix[16];       /* world to camera; always a translation by -500 along z */
   float modelMatrix[16];      /* model to world; the world origin lies 500 mm in front of the
                                  camera */
@@ -139,7 +140,8 @@ typedef struct Norvale_3DSticker_Face_Matrix {
                                  pointer: receives x, y, z per landmark, model frame, mm */
 } Norvale_3DSticker_Face_Matrix;
 
-/* Output of a frame call, owned by the host. faces[k] belongs to the k-th face passed in. */
+/* Output of a frame call, owned by the host. faces[k] belongs to the k-th face passed in. But for
+ * landmarks3D nothing has to be set before the call. */
 typedef struct Norvale_3DSticker_Matrix_Array {
   uint32_t faceNum; /* faces written; untouched when the call fails */
   Norvale_3DSticker_Face_Matrix faces[N3DS_FACE_CAPACITY];
@@ -193,7 +195,8 @@ N3DS_API void Norvale_3DSticker_DestroyEngine(void* engine);
  *   engine  handle
  *   path    face-model file: data/face_model.bin, format in docs/formats.md
  *   degree  clockwise rotation that makes the delivered image upright: 0, 90, 180 or 270
- *   mirror  1 if the delivered image is mirrored (as some front cameras do), any other value if not
+ *   mirror  1 if the delivered image is mirrored (previews often are, camera buffers seldom), any
+ *           other value if not
  *
  * Returns N3DS_OK, or
  *   N3DS_NULL_ENGINE  engine is null
@@ -213,7 +216,8 @@ N3DS_API MRESULT Norvale_3DSticker_Uninitialize(void* engine);
  * Frames are one sequence in time: each call continues the tracks of the call before. Time itself
  * is not passed: smoothing works per frame, whatever the frame rate. Faces are matched to tracks by
  * position, so their order may change. Use one engine for one mode only: both modes share the
- * tracks. With four or five faces a faster fit without smoothing is used.
+ * tracks. With four or five faces a faster fit without smoothing is used. No confidence is
+ * reported: N3DS_OK says that poses were found, not that they are right.
  *
  * The first frame with a face fixes the landmark count until Norvale_3DSticker_Uninitialize. A
  * later frame with the other count is accepted, but missing landmarks count as 0 and surplus ones
@@ -223,8 +227,8 @@ N3DS_API MRESULT Norvale_3DSticker_Uninitialize(void* engine);
  * this header.
  *
  *   engine      handle
- *   image       descriptor of the delivered image; only width and height matter, each at least 1 (an
- *               image of 1 pixel either way has no projection)
+ *   image       descriptor of the delivered image; only width and height matter, each at least 1
+ *               (an image one pixel wide or high has no projection)
  *   nFaces      0 to N3DS_MAX_FACES; 0 ends all tracks
  *   nLandmarks  landmarks per face: N3DS_LANDMARKS_101 or N3DS_LANDMARKS_165; not looked at if
  *               nFaces is 0
@@ -249,7 +253,7 @@ N3DS_API MRESULT Norvale_3DSticker_Process(void* engine, NSVL_OFFSCREEN* image, 
  *
  * The model frame is that of the mesh here, pitched by 20 degrees against the one of rigid mode
  * (docs/coordinates.md). Everything else is as in Norvale_3DSticker_Process, but this call always
- * returns: a face that cannot be fitted keeps its last pose and shape.
+ * returns: a face that cannot be fitted keeps the pose and shape it had.
  *
  *   engine      handle
  *   image       descriptor of the delivered image
@@ -304,7 +308,7 @@ N3DS_API MRESULT Norvale_3DSticker_InitializeEx(void* engine, const unsigned cha
                                                 uint32_t size, uint32_t degree, uint32_t mirror)
     N3DS_CPP_NAME("_Z30Norvale_3DSticker_InitializeExPvPKhjjj");
 
-/* Changes the orientation of the frames to come (the device was turned, or the camera switched).
+/* Changes the orientation of the frames to come (the device was rotated, or the camera switched).
  *
  * Tracks go on in upright pixels: after a camera switch pass one frame without faces to end them.
  *

@@ -72,8 +72,9 @@ def main():
     parser.add_argument("root", type=Path, help="root of the source tree")
     root = parser.parse_args().root
 
+    elsewhere = {"build", "out", ".git", "node_modules"}
     documents = [path for path in sorted(root.rglob("*.md"))
-                 if not {"build", "out", ".git", "node_modules"} & set(path.relative_to(root).parts)]
+                 if not elsewhere & set(path.relative_to(root).parts)]
     failures = list(self_check())
     if len(documents) < 8:
         failures.append(f"{root}: hardly any documents found")

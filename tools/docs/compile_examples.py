@@ -1,10 +1,11 @@
 # SPDX-License-Identifier: MIT
-"""Compiles the examples of the documents with warnings as errors: C as C99 and C++17, C++ as C++17.
+"""Compiles the examples of the documents with warnings as errors: C as C99 and C++17, C++ as
+C++17.
 
     python3 tools/docs/compile_examples.py
 
-An example is a block marked c or cpp whose first line is a comment with its file name. Ends with status 1
-when one does not compile, or when a document has a block without a name.
+An example is a block marked c or cpp whose first line is a comment with its file name. Ends with
+status 1 when one does not compile, or when a document has a block without a name.
 """
 
 import argparse
