@@ -55,7 +55,8 @@ typedef void* MHandle;
  *   area    start, rounded up to a multiple of 8
  *   length  bytes, rounded down to a multiple of 8; 32 of them are for bookkeeping
  *
- * Returns null if area is null or nothing is left after the bookkeeping. */
+ * Returns null if area is null, would end beyond the last address, or has nothing left after the
+ * bookkeeping. */
 N3DS_API MHandle MMemMgrCreate(void* area, size_t length);
 
 /* Does nothing: the area of a pool belongs to the caller. */
@@ -242,8 +243,10 @@ typedef struct N3DS_2D_TEXTURE_MASK {
  *   faceIndex  0 to the last frame's face count - 1
  *
  * Returns N3DS_OK, or
- *   N3DS_NULL_ARGUMENT  core, mask, output, model or an array of the model is null
- *   N3DS_BAD_VALUE      width, height, faceIndex, or size, format or plane of the mask image
+ *   N3DS_NULL_ARGUMENT  core, mask, output, model or, of a tracked face, an array of the model is
+ *                       null
+ *   N3DS_BAD_VALUE      width, height, faceIndex, or size, pitch, format or plane of the mask image
+ *                       is out of range, or a vertex index of the model's triangles
  *   N3DS_NO_MEMORY      no buffer for the output; its other members are set
  * Wrong counts in the mask record, or a face without a track, give a transparent output and
  * N3DS_OK. */
@@ -255,8 +258,8 @@ N3DS_API MRESULT N3DS_WarpFaceMask(void* core, const N3DS_2D_TEXTURE_MASK* mask,
  *
  * N3DS_FORMAT_BGR24: all pixels of the mask's rectangle are written; image and output must be at
  * least as large as the mask. N3DS_FORMAT_NV21: only 2 x 2 blocks that the mask touches are
- * written; the mask must be at least as large as the image, and an odd last row or column stays as
- * it is. Neither size nor planes and pitches are checked.
+ * written; mask and output must be at least as large as the image, and an odd last row or column
+ * stays as it is.
  *
  *   core    not used; may be null
  *   image   camera image, N3DS_FORMAT_BGR24 or N3DS_FORMAT_NV21
@@ -265,7 +268,8 @@ N3DS_API MRESULT N3DS_WarpFaceMask(void* core, const N3DS_2D_TEXTURE_MASK* mask,
  *
  * Returns N3DS_OK, or
  *   N3DS_NULL_ARGUMENT  image, mask or output is null
- *   N3DS_BAD_VALUE      formats are wrong or differ */
+ *   N3DS_BAD_VALUE      formats are wrong or differ, an image is too small, a plane is null or a
+ *                       pitch negative */
 N3DS_API MRESULT N3DS_BlendFaceMask(void* core, NSVL_OFFSCREEN* image, NSVL_OFFSCREEN* mask,
                                     NSVL_OFFSCREEN* output);
 
@@ -290,7 +294,7 @@ N3DS_API uint32_t YUV2RGB(uint32_t yuv);
  *
  *   landmarks      pointCount pairs x, y, pixels
  *   modelPoints    pointCount triples X, Y, Z, mm
- *   pointCount     number of points, at least 0
+ *   pointCount     number of points, 0 to 2^30 - 1
  *   camera         camera matrix
  *   pose           in: start; out: last accepted estimate, also on failure. Seven floats are always
  *                  read, and paramCount if that is more
@@ -312,7 +316,7 @@ N3DS_API uint32_t YUV2RGB(uint32_t yuv);
  *
  * Returns N3DS_OK, also if 20 iterations did not converge, or
  *   N3DS_NULL_ARGUMENT  an argument is null, or no memory for the first work arrays
- *   N3DS_BAD_VALUE      a count is negative
+ *   N3DS_BAD_VALUE      a count is out of range
  *   N3DS_NO_MEMORY      no memory for the other work arrays
  *   N3DS_NUMERICAL      a point at zero depth ("zero in zc" is printed) or a singular system */
 N3DS_API MRESULT SolveByLM(MHandle memory, const float* landmarks, const float* modelPoints,
@@ -334,7 +338,7 @@ N3DS_API MRESULT SolveByLM(MHandle memory, const float* landmarks, const float* 
  *
  * Returns N3DS_OK, or
  *   N3DS_NULL_ARGUMENT  r, landmarks, modelPoints, camera or pose is null
- *   N3DS_BAD_VALUE      some of J, JtJ and g are null and some are not, or a count is negative
+ *   N3DS_BAD_VALUE      some of J, JtJ and g are null and some are not, or a count is out of range
  *   N3DS_NUMERICAL      a point at zero depth ("zero in zc" is printed); outputs partly written
  *   N3DS_NO_MEMORY      memory is exhausted */
 N3DS_API MRESULT ComputeJacobianEtc(MHandle memory, float* J, float* JtJ, float* g, float* r,
@@ -369,8 +373,8 @@ N3DS_API MRESULT SolveLinearAxb(MHandle memory, const float* A, int32_t rows, in
  * Returns N3DS_OK, or
  *   N3DS_NULL_ARGUMENT  A, L or U is null
  *   N3DS_BAD_VALUE      n is negative
- *   N3DS_NUMERICAL      a pivot below 1e-6 ("zero in LU" is printed); the row it is in and those
- *                       below are not factorised */
+ *   N3DS_NUMERICAL      a pivot below 1e-6 ("zero in LU" is printed); written are the rows before
+ *                       it, its own up to the pivot, and the zeros and ones of all rows */
 N3DS_API MRESULT MatDecompLU(const float* A, int32_t n, float* L, float* U);
 
 /* Rotations. All return N3DS_OK, or N3DS_NULL_ARGUMENT if a pointer is null. Quaternions are w, x,
@@ -402,8 +406,8 @@ N3DS_API MRESULT MatrixInverse3X3(const float* matrix, float* inverse);
  *
  * Shut a pool down only when no other thread is inside mcvAddTask or mcvWaitTask or will call them,
  * and never from a task of the pool. Tasks that are still pending are dropped, and a thread that
- * waits for one blocks indefinitely. That another thread saw the effect of a task does not say that
- * the call which added it has returned. */
+ * waits for one blocks indefinitely. A call of mcvAddTask whose task has started no longer uses
+ * the pool. */
 typedef void* (*mcvTaskFunction)(void* argument); /* the result is ignored */
 
 enum {
@@ -530,8 +534,8 @@ N3DS_API double mcvVectorDiffNorm2Fasts16(const int16_t* a, const int16_t* b, in
  * UINT64_MAX if a or b is null. */
 N3DS_API uint64_t mcvDotProducts8(const void* a, const void* b, uint32_t n);
 
-/* Returns the number of set bits in the n bytes at p, modulo 2^32; N3DS_NULL_ARGUMENT if p is
- * null. */
+/* Returns the number of set bits in the n bytes at p; N3DS_NULL_ARGUMENT if p is null;
+ * N3DS_BAD_VALUE if the number exceeds INT32_MAX, which takes 2^28 bytes. */
 N3DS_API int32_t mcvBitCountu8(const uint8_t* p, uint32_t n);
 
 /* Square roots of one value or n of them. The vector forms return N3DS_NULL_ARGUMENT for a null
@@ -625,7 +629,8 @@ typedef struct mcvMotionRecord {
  *
  * Returns N3DS_OK, or
  *   N3DS_NULL_ARGUMENT  a record, one of its planes or a plane's pixels are null
- *   N3DS_BAD_VALUE      the sizes of a plane differ between the records or are below 1 */
+ *   N3DS_BAD_VALUE      the sizes of a plane differ between the records, are below 1, or their
+ *                       product exceeds INT64_MAX */
 N3DS_API int32_t mcvDetectMotion(const mcvMotionRecord* previous, const mcvMotionRecord* current,
                                  const mcvMotionRecord* next, mcvMotionRecord* result);
 
