@@ -2,7 +2,8 @@
 # SPDX-License-Identifier: MIT
 """Follows the links of the Markdown documents: files exist, headings they point at exist.
 
-Links to the web are not followed.
+Links to the web are not followed. A code fence must stand alone in its line, or the block behind it
+is shown as text.
 """
 
 import argparse
@@ -11,7 +12,8 @@ import sys
 import urllib.parse
 from pathlib import Path
 
-CODE = re.compile(r"^(```|~~~).*?^\1", re.MULTILINE | re.DOTALL)
+CODE = re.compile(r"^ *(```|~~~).*?^ *\1", re.MULTILINE | re.DOTALL)
+BROKEN_FENCE = re.compile(r"^.*(?:```\w*[ \t]+\S|\S[ \t]*```).*$", re.MULTILINE)
 LINK = re.compile(r"!?\[(?:[^\[\]]|\[[^\]]*\]|!\[[^\]]*\]\([^)]*\))*\]\(([^()\s]+)\)")
 PICTURE = re.compile(r"!\[[^\]]*\]\(([^()\s]+)\)")
 HEADING = re.compile(r"^#{1,6}\s+(.*?)\s*#*$", re.MULTILINE)
@@ -32,6 +34,8 @@ def anchors(text):
 
 def check(document, text, read):
     """Yields the links of a document that lead nowhere. `read` gives a file's text, or None."""
+    for line in BROKEN_FENCE.findall(text):
+        yield f"{document}: {line.strip()}: a code fence that does not stand alone"
     text = CODE.sub("", text)
     for target in LINK.findall(text) + PICTURE.findall(text):
         if re.match(r"[a-z]+:", target):
@@ -59,7 +63,8 @@ def self_check():
     sample = ("# Own\n[a](#own) [b](b.md#two-words) [c](b.md#twice-1) [w](https://example.org/x)\n"
               "[![p](c.png)](b.md)\n```\n[code](nowhere.md)\n```\n")
     bad = ["[x](nowhere.md)", "[x](b.md#twice-2)", "[x](#two-words)", "![x](nowhere.png)",
-           "[![x](nowhere.png)](b.md)", "[two\nlines](nowhere.md)"]
+           "[![x](nowhere.png)](b.md)", "[two\nlines](nowhere.md)", "```sh make\n```\n",
+           "```\nmake ```\n"]
     if list(check(Path("a.md"), sample, lambda path: files.get(path.name))):
         yield "self-check: rejects good links"
     for link in bad:
