@@ -156,27 +156,21 @@ void* _GetFace3DModel_Thread(void* argument) {
   return nullptr;
 }
 
-}  // namespace n3ds
+MRESULT ReportFaceModels(TrackingContext* context, N3DS_3D_MODEL* models,
+                         N3DS_RIGID_MATRIX* records, int32_t face_count) {
+  if (face_count < 0 || static_cast<uint32_t>(face_count) != context->faceNum) {
+    return N3DS_BAD_VALUE;
+  }
+  if (!HasModel(*context)) return N3DS_NULL_ARGUMENT;
+  // mcvParallelInit would take zero threads for as many as there are processors.
+  if (face_count == 0) return N3DS_OK;
 
-MRESULT N3DS_GetFace3DModel(void* core, N3DS_3D_MODEL* models, N3DS_RIGID_MATRIX* records,
-                            int32_t nFaces) {
-  if (core == nullptr || models == nullptr || records == nullptr) return N3DS_NULL_ARGUMENT;
-  n3ds::TrackingContext* context = n3ds::ContextOf(core);
-  if (nFaces < 0 || static_cast<uint32_t>(nFaces) != context->faceNum) return N3DS_BAD_VALUE;
-  if (!n3ds::HasModel(*context)) return N3DS_NULL_ARGUMENT;
-  // A pool of no threads would be one of as many as there are processors.
-  if (nFaces == 0) return N3DS_OK;
-
-  MRESULT result = n3ds::BuildMeshes(context, nFaces);
-  for (int32_t f = 0; f < nFaces && result == N3DS_OK; f++) {
-    models[f] = {context->shape[f], N3DS_VERTEX_COUNT, &n3ds::kTriangles[0][0],
-                 N3DS_TRIANGLE_COUNT};
-    result = n3ds::ReportFace(*context, f, n3ds::kMaskExtraVertexIndices, &records[f]);
+  MRESULT result = BuildMeshes(context, face_count);
+  for (int32_t f = 0; f < face_count && result == N3DS_OK; ++f) {
+    models[f] = {context->shape[f], N3DS_VERTEX_COUNT, &kTriangles[0][0], N3DS_TRIANGLE_COUNT};
+    result = ReportFace(*context, f, kMaskExtraVertexIndices, &records[f]);
   }
   return result;
 }
 
-int32_t N3DS_Get3DLandmarkNum(void* core) {
-  if (core == nullptr) return N3DS_NULL_ARGUMENT;
-  return static_cast<int32_t>(n3ds::ContextOf(core)->landmarkNum);
-}
+}  // namespace n3ds

@@ -4,7 +4,7 @@
 
 #include <cstdint>
 
-#include "core/model_tables.h"
+#include "core/tracking_context.h"
 
 namespace n3ds {
 
@@ -32,5 +32,9 @@ void BuildProductTable(const float* identity, const float* expression, int16_t* 
 
 // Takes a FaceMeshTask, computes the vertices of its range and returns null.
 void* _GetFace3DModel_Thread(void* task);
+
+// As N3DS_GetFace3DModel documents it.
+MRESULT ReportFaceModels(TrackingContext* context, N3DS_3D_MODEL* models,
+                         N3DS_RIGID_MATRIX* records, int32_t face_count);
 
 }  // namespace n3ds

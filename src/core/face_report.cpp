@@ -15,4 +15,15 @@ int32_t ReportFace(const TrackingContext& context, int32_t face, const int32_t e
   return ComputeLandmarks3D(input, extra_vertices, record->landmarks3D);
 }
 
+MRESULT ReportRigidFaces(const TrackingContext& context, N3DS_RIGID_MATRIX* records,
+                         int32_t face_count) {
+  if (face_count < 0 || static_cast<uint32_t>(face_count) != context.faceNum) return N3DS_BAD_VALUE;
+  for (int32_t k = 0; k < face_count; ++k) {
+    const int32_t result = ReportFace(context, k, kRidgeVertexIndices, &records[k]);
+    if (result != N3DS_OK) return result;
+    for (size_t i = 0; i < context.landmarkNum; ++i) TiltPoint(records[k].landmarks3D + 3 * i);
+  }
+  return N3DS_OK;
+}
+
 }  // namespace n3ds

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// What both modes report of a fitted face: its matrices and 3-D landmarks.
+// What is reported of a fitted face: its matrices and 3-D landmarks.
 #pragma once
 
 #include <cstdint>
@@ -13,5 +13,9 @@ namespace n3ds {
 // Returns 0; -100 when the pose's rotation cannot be inverted: no landmark is written then.
 int32_t ReportFace(const TrackingContext& context, int32_t face, const int32_t extra_vertices[4],
                    N3DS_RIGID_MATRIX* record);
+
+// As N3DS_GetRigidMatrix documents it.
+MRESULT ReportRigidFaces(const TrackingContext& context, N3DS_RIGID_MATRIX* records,
+                         int32_t face_count);
 
 }  // namespace n3ds

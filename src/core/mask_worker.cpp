@@ -1,9 +1,7 @@
 // SPDX-License-Identifier: MIT
-#include "core/mask_worker.h"
-
 #include <cstring>
 
-#include "core/face_task.h"
+#include "core/face_workers.h"
 #include "core/landmark_motion.h"
 #include "core/output_matrices.h"
 #include "core/pose_rounds.h"
@@ -15,7 +13,6 @@ namespace n3ds {
 
 namespace {
 
-constexpr int kNewFaceRounds = 3;
 constexpr int kTrackedFaceRounds = 2;
 
 // Landmarks 19 to 38, the brows, take no part in the identity of a tracked face.

@@ -1,9 +1,7 @@
 // SPDX-License-Identifier: MIT
-#include "core/rigid_worker.h"
-
 #include <cstring>
 
-#include "core/face_task.h"
+#include "core/face_workers.h"
 #include "core/landmark_motion.h"
 #include "core/output_matrices.h"
 #include "core/pose_rounds.h"
@@ -16,8 +14,6 @@
 namespace n3ds {
 
 namespace {
-
-constexpr int kNewFaceRounds = 3;
 
 // A copy of the landmarks that moves by one pixel in x and y with every failed fit: a degenerate
 // system rarely stays so when the observations change.

@@ -1,6 +1,4 @@
 // SPDX-License-Identifier: MIT
-#include "core/mask_worker.h"
-
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -13,7 +11,7 @@
 
 #include "core/contour_correspondence.h"
 #include "core/dense_model.h"
-#include "core/face_task.h"
+#include "core/face_workers.h"
 #include "core/model_tables.h"
 #include "core/pose_fitting.h"
 #include "core/pose_weights.h"

@@ -1,6 +1,4 @@
 // SPDX-License-Identifier: MIT
-#include "core/rigid_worker.h"
-
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -8,7 +6,7 @@
 #include <memory>
 #include <vector>
 
-#include "core/face_task.h"
+#include "core/face_workers.h"
 #include "core/rigid_reference.h"
 #include "support/bits.h"
 #include "support/core_context.h"

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
-// What a worker thread gets to know about its face. All pointers refer to the face's own slot of
-// the context, except where they are shared by all faces and only read.
+// The workers that fit one face of a frame each, on a thread of a task pool, and the records that
+// tell them about the face. A worker takes its record and returns null.
 #pragma once
 
 #include <cstdint>
@@ -9,6 +9,11 @@
 
 namespace n3ds {
 
+// Rounds of contour update and fit that a new face gets after its first fit, in every worker.
+constexpr int kNewFaceRounds = 3;
+
+// All pointers refer to the face's own slot of the context, except for the shared ones, which all
+// faces read.
 struct RigidFaceTask {
   MHandle memory;
   const float* meanShapeF;       // shared: mean shape in mm, 5436 floats
@@ -53,5 +58,15 @@ struct MaskFaceTask {
   const int16_t* tensor;
   int32_t* trackFlag;
 };
+
+// Rigid mode with one to three faces: smooths landmarks and pose over time and refines the face's
+// shape coefficients. Takes a RigidFaceTask.
+void* _Build3DFaceForVideo_Rigid_Thread(void* task);
+
+// Rigid mode with four and five faces: fits the pose alone. Takes a RigidFaceTask.
+void* _Build3DFaceForVideo_Rigid_Thread_Acce(void* task);
+
+// Mask mode: fits pose, identity and expression. Takes a MaskFaceTask.
+void* _Build3DFaceForVideo_Mask_Thread(void* task);
 
 }  // namespace n3ds
