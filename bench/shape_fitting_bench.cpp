@@ -103,12 +103,12 @@ BENCHMARK(SolveForExpressionCoef)
 
 void RigidRefits(benchmark::State& state) {
   const Scene s;
+  const RefitView view = {s.landmarks.data(), s.mean.data(),     s.camera, s.rotation,
+                          s.translation,      s.vertices.data(), 2};
   float identity[kIdentityCount] = {}, expression[kExpressionCount] = {};
   for (auto _ : state) {
-    RefitIdentityRigid(nullptr, s.landmarks.data(), s.mean.data(), s.identity_basis.data(),
-                       s.camera, s.rotation, s.translation, s.vertices.data(), 2, identity);
-    RefitExpressionRigid(nullptr, s.landmarks.data(), s.mean.data(), s.expression_basis.data(),
-                         s.camera, s.rotation, s.translation, s.vertices.data(), 2, expression);
+    RefitIdentityRigid(nullptr, view, s.identity_basis.data(), identity);
+    RefitExpressionRigid(nullptr, view, s.expression_basis.data(), expression);
     benchmark::DoNotOptimize(expression);
     benchmark::ClobberMemory();
   }

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "core/model_tables.h"
+#include "core/vector3.h"
 #include "norvale_3d_sticker_core.h"
 
 namespace n3ds {
@@ -34,24 +35,6 @@ struct Ring {
 };
 constexpr Ring kRings[] = {{39, 12}, {51, 12}, {75, 12}, {87, 8}};  // eyes, outer lip, inner lip
 
-struct Point3 {
-  float x, y, z;
-};
-
-Point3 VertexAt(const float* vertices, int32_t index) {
-  const float* v = vertices + 3 * static_cast<ptrdiff_t>(index);
-  return {v[0], v[1], v[2]};
-}
-
-Point3 Midpoint(const Point3& a, const Point3& b) {
-  return {(a.x + b.x) * 0.5f, (a.y + b.y) * 0.5f, (a.z + b.z) * 0.5f};
-}
-
-Point3 Rotate(const float* m, const Point3& p) {
-  return {m[0] * p.x + m[1] * p.y + m[2] * p.z, m[3] * p.x + m[4] * p.y + m[5] * p.z,
-          m[6] * p.x + m[7] * p.y + m[8] * p.z};
-}
-
 // Takes 2-D landmarks of one face back into the model's frame.
 class BackProjection {
  public:
@@ -61,21 +44,19 @@ class BackProjection {
     QuatToRotationMatrix(input_.pose, rotation_);
     const float* t = input_.pose + 4;
     if (MatrixInverse3X3(rotation_, inverse_) != N3DS_OK) return N3DS_NUMERICAL;
-    origin_ = Rotate(inverse_, {t[0], t[1], t[2]});
+    origin_ = Multiply(inverse_, {t[0], t[1], t[2]});
     return N3DS_OK;
   }
 
-  float DepthOf(const Point3& v) const {
-    return rotation_[6] * v.x + rotation_[7] * v.y + rotation_[8] * v.z + input_.pose[6];
-  }
+  float DepthOf(const Vector3& v) const { return Dot(RowOf(rotation_, 2), v) + input_.pose[6]; }
 
   // The landmark's pixel centre at a camera depth.
-  Point3 At(uint32_t landmark, float depth) const {
+  Vector3 At(uint32_t landmark, float depth) const {
     const float* k = input_.camera;
     const auto x = static_cast<float>(input_.landmarks[2 * landmark] + 0.5);
     const auto y = static_cast<float>(input_.landmarks[2 * landmark + 1] + 0.5);
-    const Point3 p =
-        Rotate(inverse_, {(x - k[2]) * depth / k[0], (y - k[5]) * depth / k[4], depth});
+    const Vector3 p =
+        Multiply(inverse_, {(x - k[2]) * depth / k[0], (y - k[5]) * depth / k[4], depth});
     return {p.x - origin_.x, p.y - origin_.y, p.z - origin_.z};
   }
 
@@ -83,21 +64,21 @@ class BackProjection {
   const Landmark3DInput& input_;
   float rotation_[9] = {};
   float inverse_[9] = {};
-  Point3 origin_ = {};
+  Vector3 origin_ = {};
 };
 
-Point3 ModelPoint(const float* vertices, const int32_t extra_vertices[4], int landmark) {
+Vector3 ModelPoint(const float* vertices, const int32_t extra_vertices[4], int landmark) {
   if (landmark < kOutlineLandmarkCount) {
-    return VertexAt(vertices, kDefaultContourVertexIndices[landmark]);
+    return VectorAt(vertices, kDefaultContourVertexIndices[landmark]);
   }
   if (landmark < kFitLandmarkCount) {
-    return VertexAt(vertices, kInnerLandmarkVertexIndices[landmark - kOutlineLandmarkCount]);
+    return VectorAt(vertices, kInnerLandmarkVertexIndices[landmark - kOutlineLandmarkCount]);
   }
   if (landmark < kRidgeLandmark) {
     const int32_t* lids = kLidVertexIndices[landmark - kPupilLandmark];
-    return Midpoint(VertexAt(vertices, lids[0]), VertexAt(vertices, lids[1]));
+    return Midpoint(VectorAt(vertices, lids[0]), VectorAt(vertices, lids[1]));
   }
-  return VertexAt(vertices, extra_vertices[landmark - kRidgeLandmark]);
+  return VectorAt(vertices, extra_vertices[landmark - kRidgeLandmark]);
 }
 
 }  // namespace
@@ -108,16 +89,16 @@ int32_t ComputeLandmarks3D(const Landmark3DInput& input, const int32_t extra_ver
   const int32_t result = back_projection.Prepare();
   if (result != N3DS_OK) return result;
 
-  const auto write = [landmarks_3d](int landmark, const Point3& p) {
+  const auto write = [landmarks_3d](int landmark, const Vector3& p) {
     std::memcpy(landmarks_3d + 3 * static_cast<ptrdiff_t>(landmark), &p, sizeof(p));
   };
   const auto count = static_cast<int>(input.landmark_count);
   float depth[kBaseLandmarkCount];
-  Point3 base[kBaseLandmarkCount];
-  for (int i = 0; i < std::min(count, kBaseLandmarkCount); i++) {
-    const Point3 v = ModelPoint(input.vertices, extra_vertices, i);
+  Vector3 base[kBaseLandmarkCount];
+  for (int i = 0; i < std::min(count, kBaseLandmarkCount); ++i) {
+    const Vector3 v = ModelPoint(input.vertices, extra_vertices, i);
     depth[i] = back_projection.DepthOf(v);
-    Point3 p = back_projection.At(static_cast<uint32_t>(i), depth[i]);
+    Vector3 p = back_projection.At(static_cast<uint32_t>(i), depth[i]);
     if (i < kOutlineLandmarkCount) {
       const float a = kOutlineShare[i];
       const float b = 1.0f - a;
@@ -130,13 +111,13 @@ int32_t ComputeLandmarks3D(const Landmark3DInput& input, const int32_t extra_ver
 
   write(kPupilRepeat, base[kPupilLandmark]);
   write(kPupilRepeat + 1, base[kPupilLandmark + 1]);
-  for (int i = kBetweenOutline; i < kBetweenRings; i++) {
+  for (int i = kBetweenOutline; i < kBetweenRings; ++i) {
     const int k = i - kBetweenOutline;
     write(i, Midpoint(base[k], base[k + 1]));
   }
   int i = kBetweenRings;
   for (const Ring& ring : kRings) {
-    for (int k = 0; k < ring.count; k++, i++) {
+    for (int k = 0; k < ring.count; ++k, ++i) {
       const float a = depth[ring.first + k];
       const float b = depth[ring.first + (k + 1) % ring.count];
       write(i, back_projection.At(static_cast<uint32_t>(i), (a + b) * 0.5f));

@@ -8,6 +8,7 @@
 #include "core/pose_weights.h"
 #include "core/shape_fitting.h"
 #include "core/tracking_context.h"
+#include "core/vector3.h"
 
 namespace n3ds {
 
@@ -15,7 +16,7 @@ namespace {
 
 constexpr int kTrackedFaceRounds = 2;
 
-// Landmarks 19 to 38, the brows, take no part in the identity of a tracked face.
+// One past the last brow landmark.
 constexpr int kBrowEnd = 39;
 
 // Shares of the pose just fitted and of the last frame's.
@@ -26,8 +27,8 @@ constexpr double kOldPose = 0.1;
 constexpr double kOldIdentity = 0.8;
 constexpr double kNewIdentity = 0.2;
 
-// Landmark smoothing lets go with half the motion that rigid mode takes: a mesh on the skin shows
-// lag where a hat does not.
+// Smoothing is released at half the motion used in rigid mode: lag shows in a mesh on the skin, but
+// not in a hat.
 constexpr double kMotionSlope = 0.05;
 constexpr float kMotionLimit = 12.0f;
 
@@ -35,69 +36,63 @@ float Blend(double a, float x, double b, float y) {
   return static_cast<float>(a * static_cast<double>(x) + b * static_cast<double>(y));
 }
 
-// The landmarks as they arrived with a depth each, for the identity fit: it works on unsmoothed
-// positions on purpose, so that smoothing does not feed back into the person's shape.
+// The landmarks with a depth each, for the identity fit. They are the unsmoothed ones, so that
+// smoothing does not feed back into the person's shape.
 class IdentityLandmarks {
  public:
   explicit IdentityLandmarks(const int32_t* landmarks) : points_{} {
-    for (int i = 0; i < kFitLandmarkCount; i++) {
-      points_[i].x = static_cast<float>(landmarks[2 * i]);
-      points_[i].y = static_cast<float>(landmarks[2 * i + 1]);
+    for (int i = 0; i < kFitLandmarkCount; ++i) {
+      points_[3 * i] = static_cast<float>(landmarks[2 * i]);
+      points_[3 * i + 1] = static_cast<float>(landmarks[2 * i + 1]);
     }
   }
 
   // Gives every inner landmark the depth of its mean-shape vertex.
   void SetDepths(const float* mean_shape, const PoseRounds& rounds) {
-    for (int i = kOutlineLandmarkCount; i < kFitLandmarkCount; i++) {
-      points_[i].z = CameraCoordinate(2, MeanVertex(mean_shape, i), rounds);
+    for (int i = kOutlineLandmarkCount; i < kFitLandmarkCount; ++i) {
+      points_[3 * i + 2] = CameraCoordinate(2, MeanVertex(mean_shape, i), rounds);
     }
   }
 
   // Puts the brows where the mean shape has them, so that raised or knitted brows are not taken for
-  // the person's. A brow point in the camera plane keeps its observed position.
+  // the person's shape. A brow point in the camera plane keeps its observed position.
   void MoveBrowsToMeanShape(const float* mean_shape, const float* camera,
                             const PoseRounds& rounds) {
-    for (int i = kOutlineLandmarkCount; i < kBrowEnd; i++) {
-      const float* v = MeanVertex(mean_shape, i);
-      Point& p = points_[i];
-      if (p.z == 0.0f) continue;
-      p.x = CameraCoordinate(0, v, rounds) * camera[0] / p.z + camera[2];
-      p.y = camera[4] * CameraCoordinate(1, v, rounds) / p.z + camera[5];
+    for (int i = kOutlineLandmarkCount; i < kBrowEnd; ++i) {
+      const Vector3 v = MeanVertex(mean_shape, i);
+      float* p = points_ + 3 * static_cast<ptrdiff_t>(i);
+      if (p[2] == 0.0f) continue;
+      p[0] = CameraCoordinate(0, v, rounds) * camera[0] / p[2] + camera[2];
+      p[1] = camera[4] * CameraCoordinate(1, v, rounds) / p[2] + camera[5];
     }
   }
 
-  const float* get() const { return &points_[0].x; }
+  const float* get() const { return points_; }
 
  private:
-  struct Point {
-    float x, y, z;
-  };
-
-  static const float* MeanVertex(const float* mean_shape, int landmark) {
-    const int32_t vertex = kInnerLandmarkVertexIndices[landmark - kOutlineLandmarkCount];
-    return mean_shape + 3 * static_cast<ptrdiff_t>(vertex);
+  static Vector3 MeanVertex(const float* mean_shape, int landmark) {
+    return VectorAt(mean_shape, kInnerLandmarkVertexIndices[landmark - kOutlineLandmarkCount]);
   }
-  static float CameraCoordinate(int axis, const float* v, const PoseRounds& rounds) {
-    const float* row = rounds.rotation() + 3 * static_cast<ptrdiff_t>(axis);
-    return row[0] * v[0] + row[1] * v[1] + row[2] * v[2] + rounds.translation()[axis];
+  static float CameraCoordinate(int axis, const Vector3& v, const PoseRounds& rounds) {
+    return Dot(RowOf(rounds.rotation(), axis), v) + rounds.translation()[axis];
   }
 
-  Point points_[kFitLandmarkCount];
+  float points_[3 * kFitLandmarkCount];  // x, y in pixels, depth in mm
 };
 
-// The status of a coefficient fit is not looked at: a fit that failed has written nothing.
-void FitIdentity(const MaskFaceTask& task, const IdentityLandmarks& landmarks, PoseRounds* rounds,
-                 float* identity) {
+// The status of a coefficient fit is ignored: a fit that failed has written nothing.
+void FitIdentity(const MaskFaceTask& task, const IdentityLandmarks& landmarks,
+                 const PoseRounds& rounds, float* identity) {
   SolveForIdentityCoef(task.memory, landmarks.get(), task.meanShape, task.identityBasis,
-                       task.camera, rounds->rotation(), rounds->translation(), identity,
-                       rounds->landmark_vertices(), task.scale);
+                       task.camera, rounds.rotation(), rounds.translation(), identity,
+                       rounds.landmark_vertices(), task.scale);
 }
 
-void FitExpression(const MaskFaceTask& task, PoseRounds* rounds) {
+void FitExpression(const MaskFaceTask& task, const PoseRounds& rounds) {
   SolveForExpressionCoef(task.memory, task.landmarks, task.meanShape, task.identityBasis,
-                         task.expressionBasis, task.tensor, task.camera, rounds->rotation(),
-                         rounds->translation(), task.identityCoef, task.expressionCoef,
-                         rounds->landmark_vertices(), task.scale);
+                         task.expressionBasis, task.tensor, task.camera, rounds.rotation(),
+                         rounds.translation(), task.identityCoef, task.expressionCoef,
+                         rounds.landmark_vertices(), task.scale);
 }
 
 // A new face gets its pose from the mean shape, and one of the two coefficient sets; the other
@@ -108,38 +103,39 @@ void StartTrack(const MaskFaceTask& task, const PoseWeights& weights, const FitW
   std::memcpy(task.shape, task.meanShapeF, kShapeSize * sizeof(float));
   rounds->StartNewFace();
   rounds->Fit(task.landmarks, kDefaultContourVertexIndices, fit_weights);
-  for (int i = 0; i < kNewFaceRounds; i++) {
+  for (int i = 0; i < kNewFaceRounds; ++i) {
     rounds->UpdateContour(task.landmarks);
     rounds->Fit(task.landmarks, rounds->contour(), fit_weights);
   }
   rounds->UpdateContour(task.landmarks);
-  rounds->AdoptContour();
+  rounds->CopyContourToLandmarks();
   std::memcpy(task.pose, task.poseRef, kPoseSize * sizeof(float));
 
   if (AllowsIdentityFit(weights)) {
     identity_landmarks->SetDepths(task.meanShapeF, *rounds);
-    FitIdentity(task, *identity_landmarks, rounds, task.identityCoef);
+    FitIdentity(task, *identity_landmarks, *rounds, task.identityCoef);
   } else {
-    FitExpression(task, rounds);
+    FitExpression(task, *rounds);
   }
   *task.trackFlag = 1;
 }
 
 void SmoothPose(const MaskFaceTask& task) {
   // The quaternion is not renormalised: its length stays near 1.
-  for (int i = 0; i < kPoseSize; i++) {
+  for (int i = 0; i < kPoseSize; ++i) {
     task.poseRef[i] = Blend(kNewPose, task.poseRef[i], kOldPose, task.pose[i]);
   }
   std::memcpy(task.pose, task.poseRef, kPoseSize * sizeof(float));
 }
 
 // A fit that failed leaves the zeros it started from, and the identity shrinks by a fifth.
-void UpdateIdentity(const MaskFaceTask& task, IdentityLandmarks* landmarks, PoseRounds* rounds) {
-  landmarks->SetDepths(task.meanShapeF, *rounds);
-  landmarks->MoveBrowsToMeanShape(task.meanShapeF, task.camera, *rounds);
+void UpdateIdentity(const MaskFaceTask& task, const PoseRounds& rounds,
+                    IdentityLandmarks* landmarks) {
+  landmarks->SetDepths(task.meanShapeF, rounds);
+  landmarks->MoveBrowsToMeanShape(task.meanShapeF, task.camera, rounds);
   float identity[kIdentityCount] = {};
   FitIdentity(task, *landmarks, rounds, identity);
-  for (int k = 0; k < kIdentityCount; k++) {
+  for (int k = 0; k < kIdentityCount; ++k) {
     task.identityCoef[k] = Blend(kOldIdentity, task.identityCoef[k], kNewIdentity, identity[k]);
   }
 }
@@ -152,20 +148,20 @@ void ContinueTrack(const MaskFaceTask& task, const PoseWeights& weights,
   BlendLandmarks(SmoothingWeights(motion, kMotionSlope, kMotionLimit), task.prevLandmarks,
                  task.landmarks);
 
-  for (int i = 0; i < kTrackedFaceRounds; i++) {
+  for (int i = 0; i < kTrackedFaceRounds; ++i) {
     rounds->Fit(task.landmarks, rounds->contour(), fit_weights);
     rounds->UpdateContour(task.landmarks);
   }
-  rounds->AdoptContour();
+  rounds->CopyContourToLandmarks();
   SmoothPose(task);
-  rounds->TakePose();
+  rounds->UpdateTransformFromPose();
 
-  if (AllowsIdentityFit(weights)) UpdateIdentity(task, identity_landmarks, rounds);
-  FitExpression(task, rounds);
+  if (AllowsIdentityFit(weights)) UpdateIdentity(task, *rounds, identity_landmarks);
+  FitExpression(task, *rounds);
 }
 
 void WriteOutputs(const MaskFaceTask& task, const PoseRounds& rounds) {
-  for (int row = 0; row < 3; row++) {
+  for (int row = 0; row < 3; ++row) {
     float* out = task.maskPose + 4 * static_cast<ptrdiff_t>(row);
     std::memcpy(out, rounds.rotation() + 3 * static_cast<ptrdiff_t>(row), 3 * sizeof(float));
     out[3] = rounds.translation()[row];
@@ -186,8 +182,7 @@ void* _Build3DFaceForVideo_Mask_Thread(void* argument) {
   const MaskFaceTask& task = *static_cast<const MaskFaceTask*>(argument);
   PoseWeights weights;
   ComputePoseWeights(task.landmarks, &weights);
-  // The ratio of the half-widths is not used here: the personal shape stands for what it makes up
-  // for with the mean shape.
+  // Without the weighting switch the inner weight has no effect.
   const FitWeights fit_weights = {0, weights.contour, weights.range, 1.0f};
   IdentityLandmarks identity_landmarks(task.landmarks);
   const bool is_new = *task.trackFlag == 0;

@@ -8,7 +8,7 @@
 
 namespace n3ds {
 
-const float kStartPose[7] = {-0.265f, 0.958f, -0.001f, -0.049f, 0.0f, 0.0f, 800.0f};
+const float kStartPose[kPoseSize] = {-0.265f, 0.958f, -0.001f, -0.049f, 0.0f, 0.0f, 800.0f};
 
 PoseRounds::PoseRounds(MHandle memory, const float* vertices, const float* camera, float* pose,
                        int32_t* contour)
@@ -16,7 +16,7 @@ PoseRounds::PoseRounds(MHandle memory, const float* vertices, const float* camer
   std::memset(landmark_vertices_, 0, kOutlineLandmarkCount * sizeof(int32_t));
   std::memcpy(landmark_vertices_ + kOutlineLandmarkCount, kInnerLandmarkVertexIndices,
               sizeof(kInnerLandmarkVertexIndices));
-  TakePose();
+  UpdateTransformFromPose();
 }
 
 bool PoseRounds::Fit(const int32_t* landmarks, const int32_t* contour, const FitWeights& weights) {
@@ -33,14 +33,14 @@ void PoseRounds::UpdateContour(const int32_t* landmarks) {
 void PoseRounds::StartNewFace() {
   std::memcpy(pose_, kStartPose, sizeof(kStartPose));
   std::memcpy(contour_, kDefaultContourVertexIndices, sizeof(kDefaultContourVertexIndices));
-  TakePose();
+  UpdateTransformFromPose();
 }
 
-void PoseRounds::AdoptContour() {
+void PoseRounds::CopyContourToLandmarks() {
   std::memcpy(landmark_vertices_, contour_, kOutlineLandmarkCount * sizeof(int32_t));
 }
 
-void PoseRounds::TakePose() {
+void PoseRounds::UpdateTransformFromPose() {
   QuatToRotationMatrix(pose_, rotation_);
   std::memcpy(translation_, pose_ + 4, sizeof(translation_));
 }

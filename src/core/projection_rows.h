@@ -13,18 +13,9 @@
 #include <cstdint>
 
 #include "core/model_tables.h"
+#include "core/vector3.h"
 
 namespace n3ds {
-
-struct Vector3 {
-  float x, y, z;
-};
-
-inline float Dot(const Vector3& a, const Vector3& b) { return a.x * b.x + a.y * b.y + a.z * b.z; }
-
-inline Vector3 RowOf(const float* matrix, int row) {
-  return {matrix[3 * row], matrix[3 * row + 1], matrix[3 * row + 2]};
-}
 
 // A vertex's vector in one component of the model, in 1/256 mm.
 inline Vector3 VertexOf(const int16_t* component, int32_t vertex) {
@@ -65,7 +56,7 @@ void ProjectBasis(const int16_t* basis, int count, int32_t vertex,
   }
 }
 
-// What the equation asks of the coefficients once the mean shape has had its part.
+// The equation's right-hand side after subtracting the mean shape's term.
 inline float RightHandSide(const ProjectionEquation& equation, const Vector3& mean) {
   return -Dot(equation.direction, mean) * kModelUnit - equation.constant;
 }

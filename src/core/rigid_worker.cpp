@@ -15,6 +15,12 @@ namespace n3ds {
 
 namespace {
 
+// Landmark smoothing by the motion of the eight steady points in percent of the face's width. The
+// motion is a sum, so the face is taken as it is from a move of an eighth of its width on.
+constexpr double kMotionSlope = 0.025;
+constexpr float kMotionLimit = 24.0f;
+constexpr float kUnsmoothedMotion = 100.0f;
+
 // A copy of the landmarks that moves by one pixel in x and y with every failed fit: a degenerate
 // system rarely stays so when the observations change.
 class ShiftedLandmarks {
@@ -52,7 +58,7 @@ void FitNewFace(const int32_t* landmarks, const FitWeights& weights, PoseRounds*
   rounds->StartNewFace();
   bool fitted = rounds->Fit(landmarks, kDefaultContourVertexIndices, weights);
   const auto run_rounds = [&](const int32_t* points) {
-    for (int i = 0; i < kNewFaceRounds; i++) {
+    for (int i = 0; i < kNewFaceRounds; ++i) {
       if (fitted) rounds->UpdateContour(points);
       fitted = rounds->Fit(points, rounds->contour(), weights);
     }
@@ -73,22 +79,21 @@ void FinishFace(const RigidFaceTask& task, const PoseRounds& rounds) {
                               task.result->projectionMatrix);
 }
 
-void RefineShape(const RigidFaceTask& task, const PoseWeights& weights, PoseRounds* rounds) {
+void RefineShape(const RigidFaceTask& task, const PoseWeights& weights, const PoseRounds& rounds) {
+  const RefitView view = {task.landmarks,    task.meanShape,       task.camera,
+                          rounds.rotation(), rounds.translation(), rounds.landmark_vertices(),
+                          task.scale};
   if (AllowsIdentityFit(weights)) {
-    RefitIdentityRigid(task.memory, task.landmarks, task.meanShape, task.identityBasis, task.camera,
-                       rounds->rotation(), rounds->translation(), rounds->landmark_vertices(),
-                       task.scale, task.identityCoef);
+    RefitIdentityRigid(task.memory, view, task.identityBasis, task.identityCoef);
   }
-  RefitExpressionRigid(task.memory, task.landmarks, task.meanShape, task.expressionBasis,
-                       task.camera, rounds->rotation(), rounds->translation(),
-                       rounds->landmark_vertices(), task.scale, task.expressionCoef);
+  RefitExpressionRigid(task.memory, view, task.expressionBasis, task.expressionCoef);
 }
 
-// Holds still landmarks back; a face that moves by more than its own width is taken as it is.
 void SmoothLandmarks(const RigidFaceTask& task, float outline_width) {
   const float motion = SteadyPointMotion(task.landmarks, task.prevLandmarks, outline_width);
-  if (motion > 100.0f) return;
-  BlendLandmarks(SmoothingWeights(motion, 0.025, 24.0f), task.prevLandmarks, task.landmarks);
+  if (motion > kUnsmoothedMotion) return;
+  BlendLandmarks(SmoothingWeights(motion, kMotionSlope, kMotionLimit), task.prevLandmarks,
+                 task.landmarks);
 }
 
 }  // namespace
@@ -115,8 +120,8 @@ void* _Build3DFaceForVideo_Rigid_Thread(void* argument) {
     FitTrackedFace(task.landmarks, weighted, plain, &rounds);
     SmoothPose(previous_pose, MotionFactor(task.landmarks, task.prevLandmarks, outline_width),
                task.pose);
-    rounds.TakePose();
-    RefineShape(task, weights, &rounds);
+    rounds.UpdateTransformFromPose();
+    RefineShape(task, weights, rounds);
     *task.trackFlag = WrapAdd(*task.trackFlag, 1);
   }
   FinishFace(task, rounds);
@@ -127,8 +132,7 @@ void* _Build3DFaceForVideo_Rigid_Thread_Acce(void* argument) {
   const RigidFaceTask& task = *static_cast<const RigidFaceTask*>(argument);
   PoseWeights weights;
   ComputePoseWeights(task.landmarks, &weights);
-  // The inner weights are left at 1 here: with four and more faces each is small in the picture,
-  // and its half-widths are too coarse to weight by.
+  // Without the weighting switch the inner weight has no effect.
   const FitWeights plain = {0, weights.contour, weights.range, 1.0f};
   PoseRounds rounds(task.memory, task.meanShapeF, task.camera, task.pose, task.fitState);
 

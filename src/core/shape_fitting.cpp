@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: MIT
 #include "core/shape_fitting.h"
 
-#include <algorithm>
 #include <array>
 
+#include "core/linear_system.h"
 #include "core/model_tables.h"
 #include "core/projection_rows.h"
-#include "platform/scratch_array.h"
 
 namespace n3ds {
 namespace {
@@ -15,14 +14,15 @@ constexpr int kLandmarkRows = 2 * kFitLandmarkCount;
 constexpr int kIdentityRows = kLandmarkRows + kInnerLandmarkCount;
 constexpr int kExpressionRows = kLandmarkRows + kExpressionCount;
 
-// Pixels an identity may pay for a mm of depth, and the price of an expression coefficient; at a
-// picture 640 wide or high.
+// Weights of a depth error of 1 mm and of an expression coefficient (ridge), for an image whose
+// longer side is 640 pixels. Residuals are pixels times mm of depth: at 800 mm, 3000 for a mm stands
+// for 3.75 pixels.
 constexpr float kDepthWeight = 3000.0f;
 constexpr float kExpressionWeight = 10000.0f;
 
-// Of a brow's ten points, only the ends and two of the upper edge are where a detector sees
-// something; they stand in for the others, so that a brow keeps its share of the system. The second
-// half of the table is the first for the other brow, ten landmarks on.
+// Of a brow's ten points only the ends and two of the upper edge are reliable; they stand in for the
+// others, so that a brow keeps its share of the system. The second half of the table is the first
+// for the other brow, ten landmarks on.
 struct Substitution {
   int landmark, stand_in;
 };
@@ -39,11 +39,11 @@ constexpr std::array<bool, kFitLandmarkCount> kObserved = [] {
   return observed;
 }();
 
-// The rows and right-hand sides of substituted landmarks become those of their stand-ins.
-void Substitute(float* A, float* b, int columns) {
+// Substituted landmarks get the equations of their stand-ins.
+void Substitute(const LinearSystem& system) {
   for (const Substitution& s : kSubstitutions) {
-    std::copy_n(A + 2 * s.stand_in * columns, 2 * columns, A + 2 * s.landmark * columns);
-    std::copy_n(b + 2 * s.stand_in, 2, b + 2 * s.landmark);
+    system.CopyRow(2 * s.stand_in, 2 * s.landmark);
+    system.CopyRow(2 * s.stand_in + 1, 2 * s.landmark + 1);
   }
 }
 
@@ -53,7 +53,7 @@ void Substitute(float* A, float* b, int columns) {
 // cache; each entry of A still takes its terms in increasing k.
 void AddInteraction(const int16_t* tensor, const float* identity_coef,
                     const int32_t* landmark_vertices, const LandmarkEquations* equations,
-                    float* A) {
+                    const LinearSystem& system) {
   for (int k = 0; k < kIdentityCount; ++k) {
     const float coefficient = identity_coef[k];
     if (coefficient == 0.0f) continue;
@@ -65,9 +65,9 @@ void AddInteraction(const int16_t* tensor, const float* identity_coef,
         const int16_t* stored = block + 3 * static_cast<ptrdiff_t>(landmark_vertices[i]);
         if ((stored[0] | stored[1] | stored[2]) == 0) continue;  // most of the tensor is zero
         const Vector3 interaction = VertexOf(block, landmark_vertices[i]);
-        float* row = A + 2 * i * kExpressionCount + j;
-        row[0] += coefficient * (Dot(equations[i].x.direction, interaction) * kModelUnit);
-        row[kExpressionCount] +=
+        system.Row(2 * i)[j] +=
+            coefficient * (Dot(equations[i].x.direction, interaction) * kModelUnit);
+        system.Row(2 * i + 1)[j] +=
             coefficient * (Dot(equations[i].y.direction, interaction) * kModelUnit);
       }
     }
@@ -85,9 +85,8 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
       identity_coef == nullptr || landmark_vertices == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  const ScratchArray<float> A(memory, static_cast<size_t>(kIdentityRows) * kIdentityCount);
-  const ScratchArray<float> b(memory, kIdentityRows);
-  if (!A || !b) return N3DS_NO_MEMORY;
+  const LinearSystem system(memory, kIdentityRows, kIdentityCount);
+  if (!system) return N3DS_NO_MEMORY;
 
   const Vector3 depth = RowOf(rotation, 2);
   const float depth_weight = kDepthWeight * scale;
@@ -97,11 +96,11 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
     const LandmarkEquations equations =
         LineariseProjection(camera, rotation, translation, point[0], point[1]);
     const Vector3 mean = VertexOf(mean_shape, vertex);
-    float* row_x = A.get() + 2 * i * kIdentityCount;
-    float* row_y = row_x + kIdentityCount;
+    float* row_x = system.Row(2 * i);
+    float* row_y = system.Row(2 * i + 1);
     if (kObserved[i]) {
-      b[2 * i] = RightHandSide(equations.x, mean);
-      b[2 * i + 1] = RightHandSide(equations.y, mean);
+      system.RightSide(2 * i) = RightHandSide(equations.x, mean);
+      system.RightSide(2 * i + 1) = RightHandSide(equations.y, mean);
     }
     if (i < kOutlineLandmarkCount) {
       ProjectBasis<2>(identity_basis, kIdentityCount, vertex,
@@ -110,9 +109,9 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
     }
 
     // An inner vertex should keep its depth: one view says little about it, and without these rows
-    // the fit would explain the picture by noses of any length.
+    // the fit would explain the image by noses of any length.
     const int depth_index = kLandmarkRows + i - kOutlineLandmarkCount;
-    float* depth_row = A.get() + depth_index * kIdentityCount;
+    float* depth_row = system.Row(depth_index);
     if (kObserved[i]) {
       ProjectBasis<3>(identity_basis, kIdentityCount, vertex,
                       {&equations.x.direction, &equations.y.direction, &depth},
@@ -121,12 +120,11 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
       ProjectBasis<1>(identity_basis, kIdentityCount, vertex, {&depth}, {depth_row});
     }
     for (int k = 0; k < kIdentityCount; ++k) depth_row[k] *= depth_weight;
-    b[depth_index] = depth_weight * (point[2] - Dot(depth, mean) * kModelUnit - translation[2]);
+    system.RightSide(depth_index) =
+        depth_weight * (point[2] - Dot(depth, mean) * kModelUnit - translation[2]);
   }
-  Substitute(A.get(), b.get(), kIdentityCount);
-
-  // A singular system has nothing to say: the coefficients stay in force.
-  SolveLinearAxb(memory, A.get(), kIdentityRows, kIdentityCount, identity_coef, b.get());
+  Substitute(system);
+  system.Solve(identity_coef);
   return N3DS_OK;
 }
 
@@ -142,9 +140,8 @@ int32_t SolveForExpressionCoef(MHandle memory, const int32_t* landmarks, const i
       expression_coef == nullptr || landmark_vertices == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  const ScratchArray<float> A(memory, static_cast<size_t>(kExpressionRows) * kExpressionCount);
-  const ScratchArray<float> b(memory, kExpressionRows);
-  if (!A || !b) return N3DS_NO_MEMORY;
+  const LinearSystem system(memory, kExpressionRows, kExpressionCount);
+  if (!system) return N3DS_NO_MEMORY;
 
   LandmarkEquations equations[kFitLandmarkCount];
   for (int i = 0; i < kFitLandmarkCount; ++i) {
@@ -154,9 +151,8 @@ int32_t SolveForExpressionCoef(MHandle memory, const int32_t* landmarks, const i
         LineariseProjection(camera, rotation, translation, static_cast<float>(landmarks[2 * i]),
                             static_cast<float>(landmarks[2 * i + 1]));
     const ProjectionEquation &x = equations[i].x, &y = equations[i].y;
-    float* row_x = A.get() + 2 * i * kExpressionCount;
     ProjectBasis<2>(expression_basis, kExpressionCount, vertex, {&x.direction, &y.direction},
-                    {row_x, row_x + kExpressionCount});
+                    {system.Row(2 * i), system.Row(2 * i + 1)});
 
     float along_x[kIdentityCount], along_y[kIdentityCount];
     ProjectBasis<2>(identity_basis, kIdentityCount, vertex, {&x.direction, &y.direction},
@@ -167,21 +163,13 @@ int32_t SolveForExpressionCoef(MHandle memory, const int32_t* landmarks, const i
       identity_y += identity_coef[k] * along_y[k];
     }
     const Vector3 mean = VertexOf(mean_shape, vertex);
-    b[2 * i] = RightHandSide(x, mean) - identity_x;
-    b[2 * i + 1] = RightHandSide(y, mean) - identity_y;
+    system.RightSide(2 * i) = RightHandSide(x, mean) - identity_x;
+    system.RightSide(2 * i + 1) = RightHandSide(y, mean) - identity_y;
   }
-  AddInteraction(tensor, identity_coef, landmark_vertices, equations, A.get());
-  Substitute(A.get(), b.get(), kExpressionCount);
-
-  float* prior = A.get() + kLandmarkRows * kExpressionCount;
-  std::fill_n(prior, kExpressionCount * kExpressionCount, 0.0f);
-  std::fill_n(b.get() + kLandmarkRows, kExpressionCount, 0.0f);
-  for (int j = 0; j < kExpressionCount; ++j) {
-    prior[j * kExpressionCount + j] = kExpressionWeight * scale;
-  }
-
-  // As above: a singular system leaves the coefficients in force.
-  SolveLinearAxb(memory, A.get(), kExpressionRows, kExpressionCount, expression_coef, b.get());
+  AddInteraction(tensor, identity_coef, landmark_vertices, equations, system);
+  Substitute(system);
+  system.SetRidge(kLandmarkRows, kExpressionWeight * scale);
+  system.Solve(expression_coef);
   return N3DS_OK;
 }
 

@@ -84,7 +84,7 @@ TEST(PoseRounds, AContourUpdateTakesTheSilhouetteUnderThePresentPose) {
   EXPECT_EQ(rounds.contour(), face.contour);
   // The table follows with the next fit, or when told.
   EXPECT_EQ(rounds.landmark_vertices()[9], kDefaultContourVertexIndices[9]);
-  rounds.AdoptContour();
+  rounds.CopyContourToLandmarks();
   EXPECT_THAT(std::vector<int32_t>(rounds.landmark_vertices(), rounds.landmark_vertices() + 19),
               ElementsAreArray(face.contour));
 }
@@ -103,7 +103,7 @@ TEST(PoseRounds, PoseIsTakenAsItIsAlsoWhenItsQuaternionIsNotOfUnitLength) {
   PoseRounds rounds = face.Rounds();
   const float longer[7] = {2, 0, 0, 0, 7, 8, 9};
   std::copy_n(longer, 7, face.pose);
-  rounds.TakePose();
+  rounds.UpdateTransformFromPose();
   EXPECT_THAT(std::vector<float>(rounds.rotation(), rounds.rotation() + 9),
               ElementsAreArray({4.0f, 0.0f, 0.0f, 0.0f, 4.0f, 0.0f, 0.0f, 0.0f, 4.0f}));
   EXPECT_EQ(rounds.translation()[1], 8.0f);

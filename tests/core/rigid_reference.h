@@ -150,13 +150,13 @@ class ReferenceRigidFace {
     QuatToRotationMatrix(pose.data(), rotation_);
     std::copy_n(&pose[4], 3, translation_);
 
+    const RefitView view = {now.data(),   model.meanShape, camera, rotation_,
+                            translation_, table_,          scale};
     if (weights.mouth_open == 0 && weights.frontal == 1 && weights.weighting_switch == 1) {
       events->identity_refits++;
-      RefitIdentityRigid(nullptr, now.data(), model.meanShape, model.identityBasis, camera,
-                         rotation_, translation_, table_, scale, identity.data());
+      RefitIdentityRigid(nullptr, view, model.identityBasis, identity.data());
     }
-    RefitExpressionRigid(nullptr, now.data(), model.meanShape, model.expressionBasis, camera,
-                         rotation_, translation_, table_, scale, expression.data());
+    RefitExpressionRigid(nullptr, view, model.expressionBasis, expression.data());
     flag++;
     End(camera);
   }

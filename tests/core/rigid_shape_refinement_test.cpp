@@ -23,14 +23,21 @@ struct Refit {
   explicit Refit(uint64_t seed) : view(seed) {}
 
   void Identity(MHandle memory, const Pixels& pixels, Vector* coef) const {
-    RefitIdentityRigid(memory, pixels.data(), model.mean.data(), model.identity.data(),
-                       view.camera.data(), view.rotation.data(), view.translation.data(),
-                       view.vertices.data(), scale, coef->data());
+    RefitIdentityRigid(memory, ViewOf(pixels, model.mean.data()), model.identity.data(),
+                       coef->data());
   }
   void Expression(MHandle memory, const Pixels& pixels, Vector* coef) const {
-    RefitExpressionRigid(memory, pixels.data(), model.mean.data(), model.expression.data(),
-                         view.camera.data(), view.rotation.data(), view.translation.data(),
-                         view.vertices.data(), scale, coef->data());
+    RefitExpressionRigid(memory, ViewOf(pixels, model.mean.data()), model.expression.data(),
+                         coef->data());
+  }
+  RefitView ViewOf(const Pixels& pixels, const int16_t* mean) const {
+    return {pixels.data(),
+            mean,
+            view.camera.data(),
+            view.rotation.data(),
+            view.translation.data(),
+            view.vertices.data(),
+            scale};
   }
 };
 
@@ -139,9 +146,9 @@ TEST(RefitIdentityRigidTest, WithoutASolutionTheCoefficientsFade) {
   const std::vector<int16_t> flat(16 * kShapeSize, 0);
   coef = previous;
   ::testing::internal::CaptureStdout();
-  RefitIdentityRigid(nullptr, pixels.data(), refit.model.mean.data(), flat.data(),
-                     refit.view.camera.data(), refit.view.rotation.data(),
-                     refit.view.translation.data(), refit.view.vertices.data(), 0, coef.data());
+  RefitView view = refit.ViewOf(pixels, refit.model.mean.data());
+  view.scale = 0;
+  RefitIdentityRigid(nullptr, view, flat.data(), coef.data());
   EXPECT_EQ(::testing::internal::GetCapturedStdout(), "zero in LU\n");
   EXPECT_TRUE(SameBits(coef, faded));
 }
@@ -196,9 +203,9 @@ TEST(RefitExpressionRigidTest, WithoutASolutionTheCoefficientsStay) {
   const std::vector<int16_t> flat(20 * kShapeSize, 0);
   Vector coef(20, 7.0f);
   ::testing::internal::CaptureStdout();
-  RefitExpressionRigid(nullptr, pixels.data(), refit.model.mean.data(), flat.data(),
-                       refit.view.camera.data(), refit.view.rotation.data(),
-                       refit.view.translation.data(), refit.view.vertices.data(), 0, coef.data());
+  RefitView view = refit.ViewOf(pixels, refit.model.mean.data());
+  view.scale = 0;
+  RefitExpressionRigid(nullptr, view, flat.data(), coef.data());
   EXPECT_EQ(::testing::internal::GetCapturedStdout(), "zero in LU\n");
   EXPECT_EQ(coef, Vector(20, 7.0f));
 }
@@ -208,9 +215,7 @@ TEST(RefitExpressionRigidTest, IsSkippedWithoutMeanShapeBasisOrCoefficients) {
   const Pixels pixels = refit.view.Pixels({}, Vector(20, 0.3f));
   Vector coef(20, 7.0f);
   const auto call = [&](const int16_t* mean, const int16_t* basis, float* out) {
-    RefitExpressionRigid(nullptr, pixels.data(), mean, basis, refit.view.camera.data(),
-                         refit.view.rotation.data(), refit.view.translation.data(),
-                         refit.view.vertices.data(), 1, out);
+    RefitExpressionRigid(nullptr, refit.ViewOf(pixels, mean), basis, out);
   };
   call(nullptr, refit.model.expression.data(), coef.data());
   call(refit.model.mean.data(), nullptr, coef.data());
