@@ -22,8 +22,8 @@ int32_t FaceDistance(const int32_t* a, const int32_t* b) {
   return sum;
 }
 
-// All that a face takes along. One array of these, filled before any slot is overwritten, lets
-// slots change places freely.
+// What a face keeps when it changes slots. An array of these, filled before any slot is overwritten,
+// lets slots change places freely.
 struct Track {
   float poseRef[kPoseSize];
   float pose[kPoseSize];
@@ -35,22 +35,31 @@ struct Track {
   int32_t trackFlag;
 };
 
-// Visits each member of a slot together with its place in a Track.
-template <typename Visit>
-void ForEachMember(TrackingContext* context, int slot, Track* track, Visit visit) {
-  visit(context->poseRef[slot], track->poseRef);
-  visit(context->pose[slot], track->pose);
-  visit(context->fitState[slot], track->fitState);
-  visit(context->shape[slot], track->shape);
-  visit(context->identityCoef[slot], track->identityCoef);
-  visit(context->expressionCoef[slot], track->expressionCoef);
-  visit(context->trackState[slot], track->trackState);
-  visit(context->trackFlag[slot], track->trackFlag);
+template <typename Member>
+void Copy(const Member& from, Member& to) {
+  std::memcpy(&to, &from, sizeof(Member));
 }
 
-template <typename Member>
-void CopyMember(const Member& from, Member& to) {
-  std::memcpy(&to, &from, sizeof(Member));
+void SaveTrack(const TrackingContext& context, int slot, Track* track) {
+  Copy(context.poseRef[slot], track->poseRef);
+  Copy(context.pose[slot], track->pose);
+  Copy(context.fitState[slot], track->fitState);
+  Copy(context.shape[slot], track->shape);
+  Copy(context.identityCoef[slot], track->identityCoef);
+  Copy(context.expressionCoef[slot], track->expressionCoef);
+  Copy(context.trackState[slot], track->trackState);
+  Copy(context.trackFlag[slot], track->trackFlag);
+}
+
+void RestoreTrack(const Track& track, int slot, TrackingContext* context) {
+  Copy(track.poseRef, context->poseRef[slot]);
+  Copy(track.pose, context->pose[slot]);
+  Copy(track.fitState, context->fitState[slot]);
+  Copy(track.shape, context->shape[slot]);
+  Copy(track.identityCoef, context->identityCoef[slot]);
+  Copy(track.expressionCoef, context->expressionCoef[slot]);
+  Copy(track.trackState, context->trackState[slot]);
+  Copy(track.trackFlag, context->trackFlag[slot]);
 }
 
 void ClearSlot(TrackingContext* context, int slot) {
@@ -59,6 +68,42 @@ void ClearSlot(TrackingContext* context, int slot) {
   std::memset(context->expressionCoef[slot], 0, sizeof(context->expressionCoef[slot]));
   std::memset(context->trackState[slot], 0, sizeof(context->trackState[slot]));
   context->trackFlag[slot] = 0;
+}
+
+// The element of 0 to count - 1 with the smallest distance; on a tie the first.
+template <typename Distance>
+uint32_t Nearest(uint32_t count, const Distance& distance) {
+  uint32_t best = 0;
+  int32_t best_distance = distance(0);
+  for (uint32_t k = 1; k < count; ++k) {
+    const int32_t d = distance(k);
+    if (d >= best_distance) continue;
+    best = k;
+    best_distance = d;
+  }
+  return best;
+}
+
+// Moves the slots of faces that changed places; `previous_landmarks` likewise.
+MRESULT MoveSlots(const FaceAssignment& assignment, uint32_t face_count, TrackingContext* context,
+                  int32_t* previous_landmarks) {
+  const size_t stride = 2 * static_cast<size_t>(context->landmarkNum);
+  const ScratchArray<Track> tracks(context->memory, kSlotCount);
+  const ScratchArray<int32_t> landmarks(context->memory, kSlotCount * stride);
+  if (!tracks || !landmarks) return N3DS_NO_MEMORY;
+  for (int slot = 0; slot < kSlotCount; ++slot) {
+    SaveTrack(*context, slot, &tracks[static_cast<size_t>(slot)]);
+  }
+  std::memcpy(landmarks.get(), previous_landmarks, kSlotCount * stride * sizeof(int32_t));
+  for (uint32_t j = 0; j < face_count; ++j) {
+    const int32_t p = assignment.previous[j];
+    if (p < 0 || static_cast<uint32_t>(p) == j) continue;
+    const auto source = static_cast<size_t>(p);
+    RestoreTrack(tracks[source], static_cast<int>(j), context);
+    std::memcpy(previous_landmarks + j * stride, landmarks.get() + source * stride,
+                stride * sizeof(int32_t));
+  }
+  return N3DS_OK;
 }
 
 }  // namespace
@@ -72,74 +117,50 @@ int32_t AssignFaces(const int32_t* landmarks, uint32_t face_count,
     return FaceDistance(landmarks + face * stride, previous_landmarks + previous * stride);
   };
   int32_t* assigned = assignment->previous;
-  for (int32_t slot = 0; slot < kSlotCount; slot++) assigned[slot] = -1;
+  for (int32_t slot = 0; slot < kSlotCount; ++slot) assigned[slot] = -1;
 
-  if (face_count > previous_count) {
-    // Each previous face claims as it scans: a claim is taken back when a nearer face turns up,
-    // even if an earlier previous face had claimed it before. The face that loses out starts
-    // afresh, which costs one frame's smoothing; a wrong track would cost many.
-    for (uint32_t p = 0; p < previous_count; p++) {
-      uint32_t best = 0;
-      int32_t best_distance = 0;
-      for (uint32_t j = 0; j < face_count; j++) {
-        const int32_t d = distance(j, p);
-        if (j > 0 && d >= best_distance) continue;
-        if (j > 0) assigned[best] = -1;
-        assigned[j] = static_cast<int32_t>(p);
-        best = j;
-        best_distance = d;
-      }
+  if (face_count <= previous_count) {
+    for (uint32_t j = 0; j < face_count; ++j) {
+      const auto to_previous = [&](uint32_t p) { return distance(j, p); };
+      assigned[j] = static_cast<int32_t>(Nearest(previous_count, to_previous));
     }
     return N3DS_OK;
   }
-  for (uint32_t j = 0; j < face_count; j++) {
+  // Each previous face claims as it scans: a claim is taken back when a nearer face turns up, even
+  // if an earlier previous face had claimed it before. The face that loses its track starts afresh,
+  // which shows for some 40 frames in mask mode; a wrong track would mix two persons.
+  for (uint32_t p = 0; p < previous_count; ++p) {
     uint32_t best = 0;
-    int32_t best_distance = distance(j, 0);
-    for (uint32_t p = 1; p < previous_count; p++) {
+    int32_t best_distance = 0;
+    for (uint32_t j = 0; j < face_count; ++j) {
       const int32_t d = distance(j, p);
-      if (d < best_distance) {
-        best = p;
-        best_distance = d;
-      }
+      if (j > 0 && d >= best_distance) continue;
+      if (j > 0) assigned[best] = -1;
+      assigned[j] = static_cast<int32_t>(p);
+      best = j;
+      best_distance = d;
     }
-    assigned[j] = static_cast<int32_t>(best);
   }
   return N3DS_OK;
 }
 
 int32_t MoveTracks(const FaceAssignment& assignment, uint32_t face_count, TrackingContext* context,
                    int32_t* previous_landmarks) {
-  const auto face_total = static_cast<int32_t>(face_count);
-  const size_t landmark_bytes = 2 * sizeof(int32_t) * static_cast<size_t>(context->landmarkNum);
-  const size_t stride = 2 * static_cast<size_t>(context->landmarkNum);
   // Most frames keep every face in its slot: then nothing is copied.
   bool moves = false;
-  for (int32_t j = 0; j < face_total; j++) {
-    moves = moves || (assignment.previous[j] >= 0 && assignment.previous[j] != j);
+  for (uint32_t j = 0; j < face_count; ++j) {
+    const int32_t p = assignment.previous[j];
+    moves = moves || (p >= 0 && static_cast<uint32_t>(p) != j);
   }
   if (moves) {
-    const ScratchArray<Track> tracks(context->memory, kSlotCount);
-    const ScratchArray<int32_t> landmarks(context->memory, kSlotCount * stride);
-    if (!tracks || !landmarks) return N3DS_NO_MEMORY;
-    for (int slot = 0; slot < kSlotCount; slot++) {
-      ForEachMember(context, slot, &tracks[static_cast<size_t>(slot)],
-                    [](const auto& from, auto& to) { CopyMember(from, to); });
-    }
-    std::memcpy(landmarks.get(), previous_landmarks, kSlotCount * landmark_bytes);
-    for (int32_t j = 0; j < face_total; j++) {
-      const int32_t p = assignment.previous[j];
-      if (p < 0 || p == j) continue;
-      const auto source = static_cast<size_t>(p);
-      ForEachMember(context, j, &tracks[source],
-                    [](auto& to, const auto& from) { CopyMember(from, to); });
-      std::memcpy(previous_landmarks + static_cast<size_t>(j) * stride,
-                  landmarks.get() + source * stride, landmark_bytes);
-    }
+    const MRESULT result = MoveSlots(assignment, face_count, context, previous_landmarks);
+    if (result != N3DS_OK) return result;
   }
-  for (int32_t j = 0; j < face_total; j++) {
+  const size_t stride = 2 * static_cast<size_t>(context->landmarkNum);
+  for (uint32_t j = 0; j < face_count; ++j) {
     if (assignment.previous[j] >= 0) continue;
-    ClearSlot(context, j);
-    std::memset(previous_landmarks + static_cast<size_t>(j) * stride, 0, landmark_bytes);
+    ClearSlot(context, static_cast<int>(j));
+    std::memset(previous_landmarks + j * stride, 0, stride * sizeof(int32_t));
   }
   return N3DS_OK;
 }

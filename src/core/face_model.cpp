@@ -3,10 +3,15 @@
 
 #include <cstring>
 
+#if __BYTE_ORDER__ != __ORDER_LITTLE_ENDIAN__
+#error "the face model is copied from its little-endian file as it is"
+#endif
+
 namespace n3ds {
 
 namespace {
 
+// The file is little-endian, as every processor the engine runs on.
 int32_t ReadInt32(const uint8_t* data) {
   int32_t value;
   std::memcpy(&value, data, sizeof(value));
@@ -53,7 +58,7 @@ int32_t LoadFaceModel(const uint8_t* data, size_t size, TrackingContext* context
   std::memcpy(arrays.identity, data + Layout::kIdentityOffset, Layout::kIdentity * sizeof(int16_t));
   std::memcpy(arrays.expression, data + Layout::kExpressionOffset,
               Layout::kExpression * sizeof(int16_t));
-  for (size_t i = 0; i < Layout::kTensor; i++) {
+  for (size_t i = 0; i < Layout::kTensor; ++i) {
     const auto step = static_cast<int8_t>(data[Layout::kTensorOffset + i]);
     arrays.tensor[i] = static_cast<int16_t>(step * kTensorStep);
   }

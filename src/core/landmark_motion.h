@@ -19,8 +19,8 @@ struct MotionSum {
   void Add(const int32_t* landmarks, const int32_t* previous, int first, int last);
 };
 
-// Motion of the eye corners' and the nose's steady points in percent of the outline width. Infinite
-// or not a number for a width of 0.
+// Motion of eight steady points of eyes and nose: the size of the sum of their moves, in percent of
+// the outline width. Infinite or NaN for a width of 0.
 float SteadyPointMotion(const int32_t* landmarks, const int32_t* previous, float outline_width);
 
 struct BlendWeights {
@@ -28,11 +28,11 @@ struct BlendWeights {
   float current;
 };
 
-// Weights that fall linearly with the motion: 0.7 - slope * motion for the previous frame below the
-// limit, 0.1 from there on and for a motion that is not a number.
+// The previous frame's weight falls linearly with the motion, 0.7 - slope * motion, below the limit;
+// it is 0.1 from there on and for a NaN motion.
 BlendWeights SmoothingWeights(float motion, double slope, float limit);
 
-// Blends the first 95 landmarks with the previous frame's, in place, truncated to whole pixels.
+// Blends the first 95 landmarks with the previous frame's, in place, truncated to integer pixels.
 void BlendLandmarks(const BlendWeights& weights, const int32_t* previous, int32_t* landmarks);
 
 }  // namespace n3ds

@@ -14,6 +14,20 @@ namespace {
 constexpr double kSmallestDivisor = 1e-6;
 constexpr double kMouthOpenRatio = 0.1;  // lip gap over mouth width
 
+// Frontal: the half-widths are even, and the eyes lie as high above the nose as this share of the
+// chin's distance below it.
+constexpr double kEvenHalves = 0.75;
+constexpr double kLowestEyes = 0.5;
+constexpr double kHighestEyes = 0.9;
+
+// Limits beyond which the weighting switch is cleared.
+constexpr double kUnevenSides = 1.15;    // longer over shorter distance of a symmetric pair
+constexpr double kLongChin = 2.3;        // mouth to chin over mouth to nose
+constexpr double kSmallestAngle = 75.0;  // between the lines of eyes and nose, degrees
+
+constexpr float kSmallestInner = 0.1f;
+constexpr float kLargestInner = 10.0f;
+
 struct Point {
   int32_t x;
   int32_t y;
@@ -52,13 +66,32 @@ double AngleInDegrees(const Normal& a, const Normal& b) {
   return std::acos(static_cast<double>(cosine)) * 180.0 / 3.14159;
 }
 
-// Whether the larger of two distances exceeds `limit` times the smaller; nothing when the smaller
-// is too small to divide by.
-enum class Comparison { kWithin, kBeyond, kUndefined };
-Comparison CompareRatio(double a, double b, double limit) {
-  const double smaller = std::min(a, b);
-  if (smaller < kSmallestDivisor) return Comparison::kUndefined;
-  return std::max(a, b) / smaller > limit ? Comparison::kBeyond : Comparison::kWithin;
+// Clears the switch when the ratio of two distances exceeds the limit. False, and nothing is done,
+// when the smaller one is too small to divide by.
+bool ClearIfBeyond(double numerator, double denominator, double limit, PoseWeights* weights) {
+  if (denominator < kSmallestDivisor) return false;
+  if (numerator / denominator > limit) weights->weighting_switch = 0;
+  return true;
+}
+bool ClearIfUneven(double a, double b, PoseWeights* weights) {
+  return ClearIfBeyond(std::max(a, b), std::min(a, b), kUnevenSides, weights);
+}
+
+// The weighting switch stays for an even, upright face only.
+template <typename PointOf>
+void CheckSwitch(const PointOf& point, const Point& nose_base, PoseWeights* weights) {
+  const Point chin = point(9);
+  if (!ClearIfUneven(Distance(chin, point(75)), Distance(chin, point(81)), weights)) return;
+  const Point mouth = Midpoint(point(75), point(81));
+  if (!ClearIfBeyond(Distance(mouth, chin), Distance(mouth, nose_base), kLongChin, weights)) return;
+  if (!ClearIfUneven(Distance(nose_base, point(39)), Distance(nose_base, point(57)), weights)) {
+    return;
+  }
+  const Point left_eye = Midpoint(point(42), point(48));
+  const Point right_eye = Midpoint(point(54), point(60));
+  const double angle =
+      AngleInDegrees(LineNormal(left_eye, right_eye), LineNormal(mouth, nose_base));
+  if (angle < kSmallestAngle) weights->weighting_switch = 0;
 }
 
 }  // namespace
@@ -94,30 +127,10 @@ int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights) {
   const double chin_distance = Distance(point(9), nose_base);
   if (chin_distance < kSmallestDivisor) return N3DS_OK;
   const double pitch_ratio = Distance(eyes, nose_base) / chin_distance;
-  if (pitch_ratio > 0.5 && symmetry > 0.75 && pitch_ratio < 0.9) weights->frontal = 1;
-
-  // The inner weights and the identity fit are for an even, upright view: anything else clears the
-  // switch.
-  const auto clear_if = [weights](Comparison comparison) {
-    if (comparison == Comparison::kBeyond) weights->weighting_switch = 0;
-    return comparison != Comparison::kUndefined;
-  };
-  if (!clear_if(CompareRatio(Distance(point(9), point(75)), Distance(point(9), point(81)), 1.15))) {
-    return N3DS_OK;
+  if (pitch_ratio > kLowestEyes && symmetry > kEvenHalves && pitch_ratio < kHighestEyes) {
+    weights->frontal = 1;
   }
-  const Point mouth = Midpoint(point(75), point(81));
-  const double mouth_to_nose = Distance(mouth, nose_base);
-  if (mouth_to_nose < kSmallestDivisor) return N3DS_OK;
-  if (Distance(mouth, point(9)) / mouth_to_nose > 2.3) weights->weighting_switch = 0;
-  if (!clear_if(
-          CompareRatio(Distance(nose_base, point(39)), Distance(nose_base, point(57)), 1.15))) {
-    return N3DS_OK;
-  }
-  const Point left_eye = Midpoint(point(42), point(48));
-  const Point right_eye = Midpoint(point(54), point(60));
-  if (AngleInDegrees(LineNormal(left_eye, right_eye), LineNormal(mouth, nose_base)) < 75.0) {
-    weights->weighting_switch = 0;
-  }
+  CheckSwitch(point, nose_base, weights);
   return N3DS_OK;
 }
 
@@ -126,8 +139,9 @@ bool AllowsIdentityFit(const PoseWeights& weights) {
 }
 
 float ClampInnerWeight(float weight) {
-  if (static_cast<double>(weight) < 0.1) return 0.1f;
-  return weight > 10.0f ? 10.0f : weight;
+  // In double, where 0.1 differs from 0.1f.
+  if (static_cast<double>(weight) < 0.1) return kSmallestInner;
+  return weight > kLargestInner ? kLargestInner : weight;
 }
 
 }  // namespace n3ds

@@ -6,14 +6,14 @@
 
 namespace n3ds {
 
-// The starting values stand where ComputePoseWeights stops early.
+// Where ComputePoseWeights stops early, the initial values remain.
 struct PoseWeights {
   int64_t mouth_open = 0;        // 1: the lips are apart
   int64_t frontal = 0;           // 1: the face looks into the camera
   int64_t weighting_switch = 1;  // 0: the face is turned, pitched or distorted
-  float contour = 0.0f;          // w1
-  float range = 0.0f;  // w2: less for an open mouth, whose lower face the mean shape lacks
-  float inner = 1.0f;  // w3: ratio of the half-widths of the face, 1 for a frontal one
+  float contour = 0.0f;          // FitWeights::contour
+  float range = 0.0f;  // FitWeights::range: less for an open mouth, which the mean shape lacks
+  float inner = 1.0f;  // FitWeights::inner: left half-width over right, 1 for a frontal face
 };
 
 // Landmarks: 95 pairs x, y. Returns 0; -1 for null landmarks. Just before a division by a distance
@@ -23,7 +23,7 @@ int32_t ComputePoseWeights(const int32_t* landmarks, PoseWeights* weights);
 // Whether the frame may refine the person's identity: mouth shut, frontal, undistorted.
 bool AllowsIdentityFit(const PoseWeights& weights);
 
-// w3 as the pose fits take it: within [0.1, 10].
+// The inner weight as the pose fits take it: within [0.1, 10].
 float ClampInnerWeight(float weight);
 
 }  // namespace n3ds

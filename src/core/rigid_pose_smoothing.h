@@ -6,8 +6,8 @@
 
 namespace n3ds {
 
-// How much further the pose is held back because the eyes move more than the mouth and the jaw:
-// then the head as a whole moves little. 1 to 2.
+// 1 to 2: how much more the previous pose counts because the eyes move more than the mouth and the
+// jaw, and the head as a whole moves little.
 //   outline_width  of this frame, before the landmarks were smoothed
 float MotionFactor(const int32_t* landmarks, const int32_t* previous, float outline_width);
 
