@@ -3,8 +3,10 @@
 
 Sums and products that numpy does element by element are the same bits everywhere. Matrix products,
 solvers and functions like the sine are not: BLAS libraries and processors differ in their last
-bits. So lengths and products of short vectors are written out here, solutions are refined until
-little more than their last bit is open, and what decisions hang on is rounded by `settled`.
+bits. Nor is compiled code that a compiler for another processor may fuse products and sums in. So
+lengths and products of short vectors, distances and interpolation are written out here, solutions
+are refined until little more than their last bit is open, and what decisions hang on is rounded by
+`settled`.
 """
 
 import sys
@@ -12,6 +14,7 @@ import sys
 import numpy as np
 import scipy.sparse as sp
 from scipy.sparse.linalg import splu
+from scipy.spatial import cKDTree
 
 
 def dot(a: np.ndarray, b: np.ndarray) -> np.ndarray:
@@ -66,3 +69,24 @@ class Solver:
             return solution + self._factors.solve(self._residual(right, solution))
         residual = np.column_stack([self._residual(*pair) for pair in zip(right.T, solution.T)])
         return solution + self._factors.solve(residual)
+
+
+class Nearest:
+    """Finds the nearest of some points; unlike the tree's own, its distances are sure bits."""
+
+    def __init__(self, points: np.ndarray):
+        self.points = points
+        self._tree = cKDTree(points)
+
+    def __call__(self, places: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
+        """Distance (n,) to the nearest point of each place (n, d), and that point's number."""
+        number = self._tree.query(places)[1]
+        return length(places - self.points[number]), number
+
+
+def interpolated(wanted: np.ndarray, along: np.ndarray, line: np.ndarray) -> np.ndarray:
+    """Points (n, d) of a polyline at lengths `wanted`, `along` being those of its own points."""
+    before = np.clip(np.searchsorted(along, wanted, side="right") - 1, 0, len(along) - 2)
+    slope = (line[before + 1] - line[before]) / (along[before + 1] - along[before])[:, None]
+    out = slope * (wanted - along[before])[:, None] + line[before]
+    return np.where((wanted >= along[-1])[:, None], line[-1], out)

@@ -11,7 +11,7 @@ from collections.abc import Callable
 
 import numpy as np
 
-from arithmetic import dot, length
+from arithmetic import dot, interpolated, length
 
 # Landmark, and the ends of its row at image left on the mean head (mm): before the ear, on the
 # cheek.
@@ -35,7 +35,7 @@ def _resampled(line, places):
     """Points of a polyline at shares of its length."""
     step = length(np.diff(line, axis=0))
     along = np.concatenate([[0.0], np.cumsum(step)]) / step.sum()
-    return np.column_stack([np.interp(places, along, line[:, k]) for k in range(line.shape[1])])
+    return interpolated(places, along, line)
 
 
 def _lines(flat_of, place_of):

@@ -7,10 +7,10 @@ from collections.abc import Callable
 from typing import TYPE_CHECKING
 
 import numpy as np
-from scipy.spatial import Delaunay, cKDTree
+from scipy.spatial import Delaunay
 
 import fields
-from arithmetic import length
+from arithmetic import Nearest, length
 from surface import Surface
 from triangulate import flip_by_shape, signed_areas
 
@@ -38,19 +38,19 @@ def _pushes(points, edges, wanted):
     return total
 
 
-def _off_the_wall(places, wall, tree, sizing):
-    distance, nearest = tree.query(places)
+def _off_the_wall(places, wall, sizing):
+    distance, nearest = wall(places)
     least = WALL_DISTANCE * sizing(places)
     close = distance < least
-    away = places - wall[nearest]
+    away = places - wall.points[nearest]
     scale = least / np.maximum(distance, 1e-9)
-    return np.where(close[:, None], wall[nearest] + away * scale[:, None], places)
+    return np.where(close[:, None], wall.points[nearest] + away * scale[:, None], places)
 
 
 def spread(places: np.ndarray, count_fixed: int, sizing: Callable, inside: Callable,
            wall: np.ndarray, rounds: int = 400) -> np.ndarray:
     """Flat places, the first `count_fixed` of them immovable (Persson and Strang's scheme)."""
-    tree = cKDTree(wall)
+    wall = Nearest(wall)
     for step in range(rounds):
         triangles = Delaunay(places).simplices
         triangles = triangles[inside(places[triangles].mean(axis=1))]
@@ -58,7 +58,7 @@ def spread(places: np.ndarray, count_fixed: int, sizing: Callable, inside: Calla
         wanted = sizing(0.5 * (places[edges[:, 0]] + places[edges[:, 1]]))
         pace = 0.2 if step < rounds * 0.8 else 0.1
         moved = places + pace * _pushes(places, edges, wanted)
-        moved = _off_the_wall(moved, wall, tree, sizing)
+        moved = _off_the_wall(moved, wall, sizing)
         ok = inside(moved)
         ok[:count_fixed] = False
         places = np.where(ok[:, None], moved, places)
@@ -72,7 +72,7 @@ def spread_on_surface(half: HalfMesh, surface: Surface, rounds: int = 160,
     No triangle is ever turned over on the flat face.
     """
     flat, triangles = half.flat.copy(), half.triangles
-    tree = cKDTree(half.wall)
+    wall = Nearest(half.wall)
     free = np.ones(len(flat), bool)
     free[half.fixed] = False
 
@@ -96,7 +96,7 @@ def spread_on_surface(half: HalfMesh, surface: Surface, rounds: int = 160,
         wanted = half.sizing(0.5 * (flat[edges[:, 0]] + flat[edges[:, 1]]))
         push = np.einsum("nij,nj->ni", back[at], _pushes(points, edges, wanted))
         pace = 0.15 if step < rounds * 0.7 else 0.06
-        moved = _off_the_wall(flat + pace * push, half.wall, tree, half.sizing)
+        moved = _off_the_wall(flat + pace * push, wall, half.sizing)
         moved = np.where(free[:, None], moved, flat)
         for _ in range(20):
             turned = signed_areas(moved, triangles) < 0.02

@@ -14,11 +14,10 @@ class Model:
 
     def __init__(self, folder: Path):
         raw = writer.read_model(folder / "face_model.bin")
-        untilt = np.linalg.inv(writer.TILT)
-        self.mean, identity, self.expression = (block @ untilt.T for block in raw[:3])
+        self.mean, identity, self.expression = (writer.upright(block) for block in raw[:3])
         self.identity = identity / writer.IDENTITY_UNIT
         steps = raw[3].astype(float) * writer.TENSOR_STEP / writer.FIXED_POINT
-        self.tensor = steps @ untilt.T / writer.IDENTITY_UNIT
+        self.tensor = writer.upright(steps) / writer.IDENTITY_UNIT
         text = (folder / "triangles.inc").read_text().split("\n", 1)[1]
         self.triangles = np.array(re.findall(r"\d+", text), int).reshape(-1, 3)
         text = (folder / "texture_coordinates.inc").read_text().split("\n", 1)[1]

@@ -9,9 +9,8 @@ from collections.abc import Callable
 from dataclasses import dataclass, field, replace
 
 import numpy as np
-from scipy.spatial import cKDTree
 
-from arithmetic import length, settled
+from arithmetic import Nearest, interpolated, length, settled
 from domain import BORDER_EDGES, CURVE_STEPS, Domain
 from relax import spread, spread_on_surface
 from sample_mesh import EYE_RING, MOUTH_RING
@@ -63,7 +62,7 @@ def _spaced(line, count, weight=None):
         step = step / weight[:-1]
     along = np.concatenate([[0.0], np.cumsum(step)])
     wanted = np.linspace(0, along[-1], count + 1)
-    return np.column_stack([np.interp(wanted, along, line[:, k]) for k in range(2)])
+    return interpolated(wanted, along, line)
 
 
 def _border_places(dom):
@@ -80,7 +79,7 @@ def _border_places(dom):
     places = np.concatenate([np.linspace(0.0, stops[0], above + 1)[:-1], stops,
                              np.linspace(stops[-1], along[-1], rest - above + 1)[1:]])
     rows = {above + k: row for k, (row, _) in enumerate(dom.stops)}
-    return np.column_stack([np.interp(places, along, line[:, k]) for k in range(2)]), rows
+    return interpolated(places, along, line), rows
 
 
 class Sizing:
@@ -90,24 +89,24 @@ class Sizing:
         def points(ids):
             return np.array([dom.place(p) for p in ids])
 
-        self.trees = {
-            "eye": cKDTree(dom.eye),
-            "lips": cKDTree(np.concatenate([dom.mouth, points(LIP_LINE)])),
-            "nose": cKDTree(points(NOSE_POINTS)),
-            "brow": cKDTree(points(BROW_POINTS)),
+        self.features = {
+            "eye": Nearest(dom.eye),
+            "lips": Nearest(np.concatenate([dom.mouth, points(LIP_LINE)])),
+            "nose": Nearest(points(NOSE_POINTS)),
+            "brow": Nearest(points(BROW_POINTS)),
         }
-        self.patch = cKDTree(np.array([dom.patch[k] for k in range(5)]))
+        self.patch = Nearest(np.array([dom.patch[k] for k in range(5)]))
 
     def __call__(self, places: np.ndarray) -> np.ndarray:
         size = np.full(len(places), np.inf)
         for name, (start, growth) in GROWTH.items():
-            size = np.minimum(size, start + growth * self.trees[name].query(places)[0])
+            size = np.minimum(size, start + growth * self.features[name](places)[0])
         # forehead and neck are coarse, cheeks and jaw finer
         up = np.clip((places[:, 1] - 22.0) / 25.0, 0.0, 1.0)
         size = np.minimum(size, SIDE_LENGTH + (FOREHEAD_LENGTH - SIDE_LENGTH) * up)
         down = np.clip((-112.0 - places[:, 1]) / 25.0, 0.0, 1.0)
         size = np.maximum(size, SIDE_LENGTH + (NECK_LENGTH - SIDE_LENGTH) * down)
-        near = self.patch.query(places)[0]
+        near = self.patch(places)[0]
         return np.maximum(size, 9.5 - 0.35 * near)
 
 
@@ -229,7 +228,7 @@ def _starting_places(fixed, wall, sizing, inside, count):
     trial = low + (high - low) * rng.random_sample((60000, 2))
     size = sizing(trial)
     trial = trial[inside(trial) & (rng.random_sample(len(trial)) < (size.min() / size) ** 2)]
-    trial = trial[cKDTree(np.concatenate([fixed, wall])).query(trial)[0] > 0.5 * sizing(trial)]
+    trial = trial[Nearest(np.concatenate([fixed, wall]))(trial)[0] > 0.5 * sizing(trial)]
     if len(trial) < count:
         raise ValueError("too few starting places")
     return trial[:count]
@@ -244,9 +243,9 @@ def half_mesh(dom: Domain) -> HalfMesh:
     frame.join(quad, closed=True)
     for point in INNER_POINTS:
         frame.vertex(dom, point)
-    crowd = cKDTree(np.array(frame.places))
+    crowd = Nearest(np.array(frame.places))
     for row, place in dom.rows:
-        if crowd.query(place)[0] > LEAST_DISTANCE:
+        if crowd(place[None])[0] > LEAST_DISTANCE:
             frame.rows.append((row, frame.add(place)))
     fixed = np.array(frame.places)
     fixed[frame.middle, 0] = 0.0

@@ -23,6 +23,11 @@ def tilted(vectors: np.ndarray) -> np.ndarray:
     return np.stack([dot(vectors, row) for row in TILT], axis=-1)
 
 
+def upright(vectors: np.ndarray) -> np.ndarray:
+    """The inverse of `tilted`, up to rounding."""
+    return np.stack([dot(vectors, row) for row in TILT.T], axis=-1) / [1.0, *dot(TILT, TILT)[1:]]
+
+
 def fixed(vectors: np.ndarray) -> np.ndarray:
     """16-bit fixed point; raises when a value does not fit."""
     values = np.rint(vectors * FIXED_POINT)
