@@ -9,6 +9,7 @@
 
 #include "core/contour_reference.h"
 #include "support/face_scene.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -302,12 +303,7 @@ TEST(ContourCorrespondence, NullArgumentsAreRefused) {
   const auto update = UpdateContourCorrespondence;
   const int32_t* l = landmarks.data();
   const float* v = vertices.data();
-  EXPECT_EQ(update(nullptr, nullptr, v, camera.k, r, t, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(update(nullptr, l, nullptr, camera.k, r, t, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(update(nullptr, l, v, nullptr, r, t, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(update(nullptr, l, v, camera.k, nullptr, t, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(update(nullptr, l, v, camera.k, r, nullptr, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(update(nullptr, l, v, camera.k, r, t, nullptr), N3DS_NULL_ARGUMENT);
+  ExpectEachNullRefused(N3DS_NULL_ARGUMENT, update, nullptr, l, v, camera.k, r, t, out);
   EXPECT_THAT(out, Each(kUntouched));
   EXPECT_EQ(update(nullptr, l, v, camera.k, r, t, out), N3DS_OK);
 }

@@ -11,6 +11,7 @@
 
 #include "core/hull_reference.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds {
@@ -67,9 +68,7 @@ TEST(ConvexHull, NullArraysAreRefused) {
   const std::vector<HullPoint> points = Numbered({{5, 1}, {9, 5}, {5, 9}, {1, 5}});
   HullPoint out[4];
   int32_t count = 99;
-  EXPECT_EQ(SearchConvexHull(nullptr, 4, out, &count), N3DS_BAD_VALUE);
-  EXPECT_EQ(SearchConvexHull(points.data(), 4, nullptr, &count), N3DS_BAD_VALUE);
-  EXPECT_EQ(SearchConvexHull(points.data(), 4, out, nullptr), N3DS_BAD_VALUE);
+  ExpectEachNullRefused(N3DS_BAD_VALUE, SearchConvexHull, points.data(), 4, out, &count);
   EXPECT_EQ(count, 99);
 }
 

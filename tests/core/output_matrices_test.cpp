@@ -11,6 +11,7 @@
 
 #include "support/bits.h"
 #include "support/face_scene.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -42,9 +43,7 @@ TEST(ModelViewMatrix, NullArgumentsAreRefused) {
   const float t[3] = {};
   float out[16];
   std::fill_n(out, 16, 3.0f);
-  EXPECT_EQ(SolveForModelViewMatrix(nullptr, t, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(SolveForModelViewMatrix(kIdentity, nullptr, out), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(SolveForModelViewMatrix(kIdentity, t, nullptr), N3DS_NULL_ARGUMENT);
+  ExpectEachNullRefused(N3DS_NULL_ARGUMENT, SolveForModelViewMatrix, kIdentity, t, out);
   EXPECT_THAT(out, Each(3.0f));
 }
 

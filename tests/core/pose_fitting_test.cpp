@@ -13,6 +13,7 @@
 #include "core/pose_rounds.h"
 #include "support/bits.h"
 #include "support/face_scene.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -117,14 +118,8 @@ TEST(FitRigidPose, NullArgumentsAreRefusedAndNothingChanges) {
   float* t = fit.translation;
   const auto call = FitRigidPose;
   const FitWeights& w = fit.weights;
-  const int32_t* c = fit.contour;
-  EXPECT_EQ(call(nullptr, nullptr, v, k, r, t, fit.pose, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, nullptr, k, r, t, fit.pose, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, v, nullptr, r, t, fit.pose, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, v, k, nullptr, t, fit.pose, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, v, k, r, nullptr, fit.pose, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, v, k, r, t, nullptr, c, fit.table, w), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(call(nullptr, l, v, k, r, t, fit.pose, c, nullptr, w), N3DS_NULL_ARGUMENT);
+  ExpectEachNullRefused(N3DS_NULL_ARGUMENT, call, nullptr, l, v, k, r, t, fit.pose, nullptr,
+                        fit.table, w);
   EXPECT_TRUE(fit.OutputsUntouched());
   EXPECT_THAT(fit.table, ElementsAreArray(before.table));
   EXPECT_THAT(fit.pose, ElementsAreArray(before.pose));

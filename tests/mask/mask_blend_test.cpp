@@ -7,6 +7,7 @@
 
 #include "mask/test_picture.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 namespace n3ds::testing {
 
@@ -140,9 +141,8 @@ TEST_P(BlendFormats, AnyCoreHandleIsAccepted) {
 
 TEST_P(BlendFormats, RejectsNullArgumentsFirst) {
   TestPicture image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGR24, 4, 4), output(GetParam(), 4, 4);
-  EXPECT_EQ(N3DS_BlendFaceMask(nullptr, nullptr, mask.get(), output.get()), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), nullptr, output.get()), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), nullptr), N3DS_NULL_ARGUMENT);
+  ExpectEachNullRefused(N3DS_NULL_ARGUMENT, N3DS_BlendFaceMask, nullptr, image.get(), mask.get(),
+                        output.get());
 }
 
 TEST_P(BlendFormats, RejectsAMaskWithoutAlphaAndDifferentFormatsBeforeWriting) {

@@ -14,6 +14,7 @@
 #include "mask/test_picture.h"
 #include "mask/warp_scene.h"
 #include "norvale_3d_sticker_core.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 namespace n3ds::testing {
 
@@ -140,10 +141,7 @@ TEST_F(MaskWarp, RejectsNullArgumentsAndLeavesTheOutputAlone) {
   const N3DS_3D_MODEL model = scene_.Model();
   void* core = context_.get();
   NSVL_OFFSCREEN* out = output.get();
-  EXPECT_EQ(N3DS_WarpFaceMask(nullptr, &mask, out, &model, 16, 12, 0), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(N3DS_WarpFaceMask(core, nullptr, out, &model, 16, 12, 0), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(N3DS_WarpFaceMask(core, &mask, nullptr, &model, 16, 12, 0), N3DS_NULL_ARGUMENT);
-  EXPECT_EQ(N3DS_WarpFaceMask(core, &mask, out, nullptr, 16, 12, 0), N3DS_NULL_ARGUMENT);
+  ExpectEachNullRefused(N3DS_NULL_ARGUMENT, N3DS_WarpFaceMask, core, &mask, out, &model, 16, 12, 0);
   const N3DS_3D_MODEL empty = {};
   EXPECT_EQ(N3DS_WarpFaceMask(core, &mask, out, &empty, 16, 12, 0), N3DS_NULL_ARGUMENT);
   // Null comes before bad values.

@@ -7,6 +7,7 @@
 #include "support/bits.h"
 #include "support/captured_output.h"
 #include "support/memory_pool.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -125,9 +126,7 @@ TEST(MatDecompLUTest, NegativeSizeIsRefused) {
 TEST(MatDecompLUTest, NullPointersAreRefusedBeforeTheSizeIsLookedAt) {
   float value = 1;
   for (const int n : {1, 0, -1}) {
-    EXPECT_EQ(MatDecompLU(nullptr, n, &value, &value), N3DS_NULL_ARGUMENT);
-    EXPECT_EQ(MatDecompLU(&value, n, nullptr, &value), N3DS_NULL_ARGUMENT);
-    EXPECT_EQ(MatDecompLU(&value, n, &value, nullptr), N3DS_NULL_ARGUMENT);
+    ExpectEachNullRefused(N3DS_NULL_ARGUMENT, MatDecompLU, &value, n, &value, &value);
   }
 }
 
@@ -344,9 +343,7 @@ TEST(SolveLinearAxbTest, NoUnknownsIsSolvedAtOnce) {
 TEST(SolveLinearAxbTest, NullPointersAreRefusedBeforeTheSizesAreLookedAt) {
   float v = 1;
   for (const int rows : {1, -1}) {
-    EXPECT_EQ(SolveLinearAxb(nullptr, nullptr, rows, 1, &v, &v), N3DS_NULL_ARGUMENT);
-    EXPECT_EQ(SolveLinearAxb(nullptr, &v, rows, 1, nullptr, &v), N3DS_NULL_ARGUMENT);
-    EXPECT_EQ(SolveLinearAxb(nullptr, &v, rows, 1, &v, nullptr), N3DS_NULL_ARGUMENT);
+    ExpectEachNullRefused(N3DS_NULL_ARGUMENT, SolveLinearAxb, nullptr, &v, rows, 1, &v, &v);
   }
 }
 

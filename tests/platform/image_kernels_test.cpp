@@ -9,6 +9,7 @@
 
 #include "norvale_3d_sticker_core.h"
 #include "support/guarded_array.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -96,9 +97,7 @@ TEST(BitwiseOr, NullAndEmpty) {
   const uint8_t a = 1;
   uint8_t dst = 0;
   for (const int32_t height : {1, 0}) {
-    EXPECT_EQ(mcvBitwiseOru8(nullptr, &a, &dst, 1, height, 1, 1, 1), -1);
-    EXPECT_EQ(mcvBitwiseOru8(&a, nullptr, &dst, 1, height, 1, 1, 1), -1);
-    EXPECT_EQ(mcvBitwiseOru8(&a, &a, nullptr, 1, height, 1, 1, 1), -1);
+    ExpectEachNullRefused(-1, mcvBitwiseOru8, &a, &a, &dst, 1, height, 1, 1, 1);
   }
   EXPECT_EQ(mcvBitwiseOru8(&a, &a, &dst, 1, 0, 1, 1, 1), 0);
   EXPECT_EQ(mcvBitwiseOru8(&a, &a, &dst, 0, 1, 1, 1, 1), 0);
@@ -140,9 +139,7 @@ TEST(YuyvSplit, NullAndEmpty) {
   uint8_t luma = 0;
   uint8_t chroma = 0;
   for (const int32_t height : {1, 0}) {
-    EXPECT_EQ(mcvYUYVToOrgData(nullptr, 2, height, &luma, &chroma), -1);
-    EXPECT_EQ(mcvYUYVToOrgData(src, 2, height, nullptr, &chroma), -1);
-    EXPECT_EQ(mcvYUYVToOrgData(src, 2, height, &luma, nullptr), -1);
+    ExpectEachNullRefused(-1, mcvYUYVToOrgData, src, 2, height, &luma, &chroma);
   }
   EXPECT_EQ(mcvYUYVToOrgData(src, 2, 0, &luma, &chroma), 0);
   EXPECT_EQ(mcvYUYVToOrgData(src, 2, -1, &luma, &chroma), 0);
@@ -231,10 +228,8 @@ TEST_F(DetectMotion, RandomPicturesWithPlanesOfDifferentSizes) {
 }
 
 TEST_F(DetectMotion, NullRecordPlaneOrPixels) {
-  EXPECT_EQ(mcvDetectMotion(nullptr, current_.record(), next_.record(), mask_.record()), -1);
-  EXPECT_EQ(mcvDetectMotion(previous_.record(), nullptr, next_.record(), mask_.record()), -1);
-  EXPECT_EQ(mcvDetectMotion(previous_.record(), current_.record(), nullptr, mask_.record()), -1);
-  EXPECT_EQ(mcvDetectMotion(previous_.record(), current_.record(), next_.record(), nullptr), -1);
+  ExpectEachNullRefused(-1, mcvDetectMotion, previous_.record(), current_.record(), next_.record(),
+                        mask_.record());
   for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
     for (size_t i = 0; i < 3; ++i) {
       picture->record()->plane[i] = nullptr;

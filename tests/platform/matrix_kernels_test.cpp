@@ -7,6 +7,7 @@
 #include "norvale_3d_sticker_core.h"
 #include "support/bits.h"
 #include "support/guarded_array.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -99,22 +100,12 @@ TEST(MatrixElementKernels, NullMatrixIsRefusedWhateverTheSizes) {
   float f = 1.0f;
   int32_t i = 1;
   for (const int32_t size : {1, 0}) {
-    EXPECT_EQ(mcvMatrixAddMatrix_f32(nullptr, &f, &f, size, size), -1);
-    EXPECT_EQ(mcvMatrixAddMatrix_f32(&f, nullptr, &f, size, size), -1);
-    EXPECT_EQ(mcvMatrixAddMatrix_f32(&f, &f, nullptr, size, size), -1);
-    EXPECT_EQ(mcvMatrixAddMatrix_s32(nullptr, &i, &i, size, size), -1);
-    EXPECT_EQ(mcvMatrixAddMatrix_s32(&i, nullptr, &i, size, size), -1);
-    EXPECT_EQ(mcvMatrixAddMatrix_s32(&i, &i, nullptr, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_f32(nullptr, &f, &f, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_f32(&f, nullptr, &f, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_f32(&f, &f, nullptr, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_s32(nullptr, &i, &i, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_s32(&i, nullptr, &i, size, size), -1);
-    EXPECT_EQ(mcvMatrixSubMatrix_s32(&i, &i, nullptr, size, size), -1);
-    EXPECT_EQ(mcvMatrixMulScalar_f32(nullptr, &f, size, size, 2.0f), -1);
-    EXPECT_EQ(mcvMatrixMulScalar_f32(&f, nullptr, size, size, 2.0f), -1);
-    EXPECT_EQ(mcvMatrixMulScalar_s32(nullptr, &i, 2, size, size), -1);
-    EXPECT_EQ(mcvMatrixMulScalar_s32(&i, nullptr, 2, size, size), -1);
+    ExpectEachNullRefused(-1, mcvMatrixAddMatrix_f32, &f, &f, &f, size, size);
+    ExpectEachNullRefused(-1, mcvMatrixAddMatrix_s32, &i, &i, &i, size, size);
+    ExpectEachNullRefused(-1, mcvMatrixSubMatrix_f32, &f, &f, &f, size, size);
+    ExpectEachNullRefused(-1, mcvMatrixSubMatrix_s32, &i, &i, &i, size, size);
+    ExpectEachNullRefused(-1, mcvMatrixMulScalar_f32, &f, &f, size, size, 2.0f);
+    ExpectEachNullRefused(-1, mcvMatrixMulScalar_s32, &i, &i, 2, size, size);
   }
 }
 
@@ -286,26 +277,12 @@ TEST(MatrixProducts, NullMatrixIsRefusedWhateverTheSizes) {
   int64_t wide = 7;
   float F = 7.0f;
   for (const int32_t d : {1, 0}) {
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s32(nullptr, &a, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s32(&C, nullptr, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s32(&C, &a, nullptr, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s64(nullptr, &s, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s64(&wide, nullptr, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_s64(&wide, &s, nullptr, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_s32(nullptr, &a, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_s32(&C, nullptr, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_s32(&C, &a, nullptr, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_f32(nullptr, &f, &f, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_f32(&F, nullptr, &f, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixColMajor_f32(&F, &f, nullptr, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_s32(nullptr, &a, &a, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_s32(&C, nullptr, &a, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_s32(&C, &a, nullptr, &a, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_s32(&C, &a, &a, nullptr, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_f32(nullptr, &f, &f, &f, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_f32(&F, nullptr, &f, &f, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_f32(&F, &f, nullptr, &f, d, d, d), -1);
-    EXPECT_EQ(mcvMatrixMulAddRowMajor_f32(&F, &f, &f, nullptr, d, d, d), -1);
+    ExpectEachNullRefused(-1, mcvMatrixMulMatrixRowMajor_s32, &C, &a, &a, d, d, d);
+    ExpectEachNullRefused(-1, mcvMatrixMulMatrixRowMajor_s64, &wide, &s, &a, d, d, d);
+    ExpectEachNullRefused(-1, mcvMatrixMulMatrixColMajor_s32, &C, &a, &a, d, d, d);
+    ExpectEachNullRefused(-1, mcvMatrixMulMatrixColMajor_f32, &F, &f, &f, d, d, d);
+    ExpectEachNullRefused(-1, mcvMatrixMulAddRowMajor_s32, &C, &a, &a, &a, d, d, d);
+    ExpectEachNullRefused(-1, mcvMatrixMulAddRowMajor_f32, &F, &f, &f, &f, d, d, d);
   }
   EXPECT_EQ(C, 7);
   EXPECT_EQ(wide, 7);

@@ -6,6 +6,7 @@
 #include "norvale_3d_sticker_core.h"
 #include "support/bits.h"
 #include "support/guarded_array.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -151,9 +152,7 @@ TEST(MatrixProduct, NullMatrixIsRefusedWhateverTheSizes) {
   const float a = 1.0f;
   float c = kUntouched;
   for (const int size : {1, 0, -1}) {
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_f32(nullptr, &a, &a, size, size, size), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_f32(&c, nullptr, &a, size, size, size), -1);
-    EXPECT_EQ(mcvMatrixMulMatrixRowMajor_f32(&c, &a, nullptr, size, size, size), -1);
+    ExpectEachNullRefused(-1, mcvMatrixMulMatrixRowMajor_f32, &c, &a, &a, size, size, size);
   }
   EXPECT_EQ(c, kUntouched);
 }

@@ -8,6 +8,7 @@
 #include "norvale_3d_sticker_core.h"
 #include "support/bits.h"
 #include "support/guarded_array.h"
+#include "support/null_arguments.h"
 #include "support/test_random.h"
 
 namespace n3ds::testing {
@@ -72,10 +73,8 @@ TEST(InverseSquareRoot, IsCloseOverTheWholeRange) {
 TEST(RootVectors, NullAndEmpty) {
   float f = 1.0f;
   for (const int32_t n : {1, 0, -1}) {
-    EXPECT_EQ(mcvSqrtVectorf32(nullptr, &f, n), -1);
-    EXPECT_EQ(mcvSqrtVectorf32(&f, nullptr, n), -1);
-    EXPECT_EQ(mcvInvSqrtVectorf32(nullptr, &f, n), -1);
-    EXPECT_EQ(mcvInvSqrtVectorf32(&f, nullptr, n), -1);
+    ExpectEachNullRefused(-1, mcvSqrtVectorf32, &f, &f, n);
+    ExpectEachNullRefused(-1, mcvInvSqrtVectorf32, &f, &f, n);
   }
   const float four = 4.0f;
   EXPECT_EQ(mcvSqrtVectorf32(&four, &f, 0), 0);

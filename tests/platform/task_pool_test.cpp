@@ -16,6 +16,7 @@
 
 #include "norvale_3d_sticker_core.h"
 #include "platform/cpu_testing.h"
+#include "support/watchdog.h"
 
 // The linker sends the pool's thread calls here (--wrap), so that a test can count them and make
 // the system refuse a thread.
@@ -131,6 +132,10 @@ class TaskPoolTest : public ::testing::Test {
   }
 
   FakeCpus cpus_{64, 64};
+
+ private:
+  // A hundred times what the slowest of these tests takes.
+  Watchdog watchdog_{60};
 };
 
 TEST_F(TaskPoolTest, StartsAsManyWorkersAsRequestedAndConfigured) {
