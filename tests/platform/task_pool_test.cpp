@@ -88,9 +88,9 @@ void* Increment(void* counter) {
   return counter;
 }
 
-class TaskPoolTest : public ::testing::Test {
+class TaskPools : public ::testing::Test {
  protected:
-  TaskPoolTest() {
+  TaskPools() {
     create_calls_until_refusal = -1;
     threads_created = 0;
     threads_joined = 0;
@@ -138,7 +138,7 @@ class TaskPoolTest : public ::testing::Test {
   Watchdog watchdog_{60};
 };
 
-TEST_F(TaskPoolTest, StartsAsManyWorkersAsRequestedAndConfigured) {
+TEST_F(TaskPools, StartsAsManyWorkersAsRequestedAndConfigured) {
   cpus_.SetCounts(8, 8);
   EXPECT_EQ(WorkersFor(4), 4u);
   EXPECT_EQ(WorkersFor(8), 8u);
@@ -152,12 +152,12 @@ TEST_F(TaskPoolTest, StartsAsManyWorkersAsRequestedAndConfigured) {
   EXPECT_EQ(WorkersFor(4), 1u);
 }
 
-TEST_F(TaskPoolTest, StartsAtMostSixteenWorkers) {
+TEST_F(TaskPools, StartsAtMostSixteenWorkers) {
   cpus_.SetCounts(64, 64);
   EXPECT_EQ(WorkersFor(40), 16u);
 }
 
-TEST_F(TaskPoolTest, ZeroRequestedMeansTheOnlineProcessors) {
+TEST_F(TaskPools, ZeroRequestedMeansTheOnlineProcessors) {
   cpus_.SetCounts(8, 3);
   EXPECT_EQ(WorkersFor(0), 3u);
   cpus_.SetCounts(64, 40);
@@ -166,7 +166,7 @@ TEST_F(TaskPoolTest, ZeroRequestedMeansTheOnlineProcessors) {
   EXPECT_EQ(WorkersFor(0), 1u);
 }
 
-TEST_F(TaskPoolTest, FreshPoolIsEmpty) {
+TEST_F(TaskPools, FreshPoolIsEmpty) {
   cpus_.SetCounts(40, 12);
   TaskPool* pool = MakePool(2);
   EXPECT_EQ(pool->taskCount, 0u);
@@ -184,7 +184,7 @@ TEST_F(TaskPoolTest, FreshPoolIsEmpty) {
   EXPECT_EQ(threads_joined, 2);
 }
 
-TEST_F(TaskPoolTest, RunsEveryTaskOnce) {
+TEST_F(TaskPools, RunsEveryTaskOnce) {
   for (const uint32_t workers : {1u, 3u, 16u}) {
     TaskPool* pool = MakePool(workers);
     std::array<std::atomic<int>, 32> counters = {};
@@ -201,7 +201,7 @@ TEST_F(TaskPoolTest, RunsEveryTaskOnce) {
   }
 }
 
-TEST_F(TaskPoolTest, WorkersRunAtTheSameTime) {
+TEST_F(TaskPools, WorkersRunAtTheSameTime) {
   TaskPool* pool = MakePool(4);
   Gate gate;
   for (int i = 0; i < 4; ++i) mcvAddTask(pool, PassGate, &gate);
@@ -211,7 +211,7 @@ TEST_F(TaskPoolTest, WorkersRunAtTheSameTime) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, RingsWrapAround) {
+TEST_F(TaskPools, RingsWrapAround) {
   TaskPool* pool = MakePool(2);
   std::atomic<int> counter = 0;
   for (int round = 0; round < 40; ++round) {
@@ -223,7 +223,7 @@ TEST_F(TaskPoolTest, RingsWrapAround) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, ThirtyThirdPendingTaskIsRefused) {
+TEST_F(TaskPools, ThirtyThirdPendingTaskIsRefused) {
   TaskPool* pool = MakePool(1);
   Gate first;
   Gate second;
@@ -247,7 +247,7 @@ TEST_F(TaskPoolTest, ThirtyThirdPendingTaskIsRefused) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, WaitingInReverseOrderOfCompletion) {
+TEST_F(TaskPools, WaitingInReverseOrderOfCompletion) {
   TaskPool* pool = MakePool(1);
   std::atomic<int> counter = 0;
   for (int i = 0; i < 32; ++i) mcvAddTask(pool, Increment, &counter);
@@ -257,7 +257,7 @@ TEST_F(TaskPoolTest, WaitingInReverseOrderOfCompletion) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, WaitingTurnsTheFinishedRing) {
+TEST_F(TaskPools, WaitingTurnsTheFinishedRing) {
   TaskPool* pool = MakePool(1);
   std::atomic<int> counter = 0;
   for (int i = 0; i < 5; ++i) mcvAddTask(pool, Increment, &counter);
@@ -272,7 +272,7 @@ TEST_F(TaskPoolTest, WaitingTurnsTheFinishedRing) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, WaitingForARunningTaskKeepsTheFinishedOnes) {
+TEST_F(TaskPools, WaitingForARunningTaskKeepsTheFinishedOnes) {
   TaskPool* pool = MakePool(2);
   Gate gate;
   std::atomic<int> counter = 0;
@@ -286,7 +286,7 @@ TEST_F(TaskPoolTest, WaitingForARunningTaskKeepsTheFinishedOnes) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, EveryWaiterIsWokenByItsOwnTask) {
+TEST_F(TaskPools, EveryWaiterIsWokenByItsOwnTask) {
   // If a signal woke one waiter only, the one whose task still runs could take it and sleep on.
   TaskPool* pool = MakePool(2);
   for (int round = 0; round < 20; ++round) {
@@ -303,7 +303,7 @@ TEST_F(TaskPoolTest, EveryWaiterIsWokenByItsOwnTask) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, ManyThreadsAddAndWait) {
+TEST_F(TaskPools, ManyThreadsAddAndWait) {
   TaskPool* pool = MakePool(4);
   std::atomic<int> counter = 0;
   std::mutex mutex;
@@ -328,7 +328,7 @@ TEST_F(TaskPoolTest, ManyThreadsAddAndWait) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, IdsStartAgainBeforeTheLargestInteger) {
+TEST_F(TaskPools, IdsStartAgainBeforeTheLargestInteger) {
   TaskPool* pool = MakePool(1);
   std::atomic<int> counter = 0;
   pthread_mutex_lock(&pool->queueLock);
@@ -342,7 +342,7 @@ TEST_F(TaskPoolTest, IdsStartAgainBeforeTheLargestInteger) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, IdBeyondAFullFinishedRingIsLost) {
+TEST_F(TaskPools, IdBeyondAFullFinishedRingIsLost) {
   TaskPool* pool = MakePool(1);
   Gate gate;
   std::atomic<int> counter = 0;
@@ -362,7 +362,7 @@ TEST_F(TaskPoolTest, IdBeyondAFullFinishedRingIsLost) {
   EXPECT_EQ(finished.back(), 31);
 }
 
-TEST_F(TaskPoolTest, ThirtyTwoFinishedIdsAreAllKept) {
+TEST_F(TaskPools, ThirtyTwoFinishedIdsAreAllKept) {
   TaskPool* pool = MakePool(1);
   std::atomic<int> counter = 0;
   ::testing::internal::CaptureStdout();
@@ -373,7 +373,7 @@ TEST_F(TaskPoolTest, ThirtyTwoFinishedIdsAreAllKept) {
   EXPECT_EQ(::testing::internal::GetCapturedStdout(), "");
 }
 
-TEST_F(TaskPoolTest, SecondShutdownIsRefusedWhileTheFirstRuns) {
+TEST_F(TaskPools, SecondShutdownIsRefusedWhileTheFirstRuns) {
   TaskPool* pool = MakePool(1);
   Gate gate;
   mcvAddTask(pool, PassGate, &gate);
@@ -392,7 +392,7 @@ TEST_F(TaskPoolTest, SecondShutdownIsRefusedWhileTheFirstRuns) {
   EXPECT_EQ(threads_joined, 1);
 }
 
-TEST_F(TaskPoolTest, ShutdownDropsPendingTasks) {
+TEST_F(TaskPools, ShutdownDropsPendingTasks) {
   TaskPool* pool = MakePool(1);
   Gate gate;
   std::atomic<int> counter = 0;
@@ -412,7 +412,7 @@ TEST_F(TaskPoolTest, ShutdownDropsPendingTasks) {
 }
 
 // The task's effect may shut the pool down before the call that added it is back.
-TEST_F(TaskPoolTest, TaskMaySetOffTheShutdown) {
+TEST_F(TaskPools, TaskMaySetOffTheShutdown) {
   for (int round = 0; round < 100; ++round) {
     TaskPool* pool = MakePool(1);
     std::atomic<int> ran{0};
@@ -423,7 +423,7 @@ TEST_F(TaskPoolTest, TaskMaySetOffTheShutdown) {
   }
 }
 
-TEST_F(TaskPoolTest, NullArguments) {
+TEST_F(TaskPools, NullArguments) {
   std::atomic<int> counter = 0;
   EXPECT_EQ(mcvAddTask(nullptr, Increment, &counter), -1);
   EXPECT_EQ(mcvWaitTask(nullptr, 0), -1);
@@ -436,7 +436,7 @@ TEST_F(TaskPoolTest, NullArguments) {
   EXPECT_EQ(mcvParallelUninit(pool), 0);
 }
 
-TEST_F(TaskPoolTest, TakesItsMemoryFromTheHandleAndGivesAllBack) {
+TEST_F(TaskPools, TakesItsMemoryFromTheHandleAndGivesAllBack) {
   std::vector<uint64_t> area(1024);
   MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
   const size_t before = GetMaxAllocMemSize(memory);
@@ -447,7 +447,7 @@ TEST_F(TaskPoolTest, TakesItsMemoryFromTheHandleAndGivesAllBack) {
   EXPECT_EQ(GetMaxAllocMemSize(memory), before);
 }
 
-TEST_F(TaskPoolTest, ExhaustedMemoryGivesNullAndLeavesNothingBehind) {
+TEST_F(TaskPools, ExhaustedMemoryGivesNullAndLeavesNothingBehind) {
   // Areas from too small for the context up to one that suffices meet every allocation on the way.
   std::set<int> workers_before_failure;
   std::vector<uint64_t> area(1024);
@@ -470,7 +470,7 @@ TEST_F(TaskPoolTest, ExhaustedMemoryGivesNullAndLeavesNothingBehind) {
   EXPECT_THAT(workers_before_failure, ElementsAre(0, 1, 2));
 }
 
-TEST_F(TaskPoolTest, RefusedThreadGivesNullAndLeavesNothingBehind) {
+TEST_F(TaskPools, RefusedThreadGivesNullAndLeavesNothingBehind) {
   std::vector<uint64_t> area(1024);
   MHandle memory = MMemMgrCreate(area.data(), area.size() * 8);
   const size_t before = GetMaxAllocMemSize(memory);
@@ -484,7 +484,7 @@ TEST_F(TaskPoolTest, RefusedThreadGivesNullAndLeavesNothingBehind) {
   }
 }
 
-TEST_F(TaskPoolTest, PoolMemoryFunctionsAreThoseOfTheMemoryLayer) {
+TEST_F(TaskPools, PoolMemoryFunctionsAreThoseOfTheMemoryLayer) {
   alignas(8) unsigned char area[128];
   MHandle memory = MMemMgrCreate(area, sizeof(area));
   void* p = mcvMemAlloc(memory, 8);
