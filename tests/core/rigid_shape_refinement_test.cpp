@@ -90,7 +90,7 @@ Vector Blend(const Vector& previous, const Vector& solution) {
   return out;
 }
 
-TEST(RefitIdentityRigidTest, BlendsTheSolutionOfTheOutlineBitForBit) {
+TEST(RefitIdentityRigid, BlendsTheSolutionOfTheOutlineBitForBit) {
   Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Refit refit(random.Next());
@@ -106,7 +106,7 @@ TEST(RefitIdentityRigidTest, BlendsTheSolutionOfTheOutlineBitForBit) {
   }
 }
 
-TEST(RefitIdentityRigidTest, RepeatedRefitsCloseInOnTheSolution) {
+TEST(RefitIdentityRigid, RepeatedRefitsCloseInOnTheSolution) {
   Random random = TestRandom();
   const Refit refit(random.Next());
   const Pixels pixels = refit.view.Pixels(RandomCoefficients(&random, 16, 0.5), {});
@@ -117,7 +117,7 @@ TEST(RefitIdentityRigidTest, RepeatedRefitsCloseInOnTheSolution) {
   for (int k = 0; k < 16; ++k) EXPECT_NEAR(coef[k], solution[k], 1e-5);
 }
 
-TEST(RefitIdentityRigidTest, InnerLandmarksPlayNoPart) {
+TEST(RefitIdentityRigid, InnerLandmarksPlayNoPart) {
   Random random = TestRandom();
   const Refit refit(random.Next());
   Pixels pixels = refit.view.Pixels({}, {});
@@ -131,7 +131,7 @@ TEST(RefitIdentityRigidTest, InnerLandmarksPlayNoPart) {
   EXPECT_FALSE(SameBits(before, after));
 }
 
-TEST(RefitIdentityRigidTest, WithoutASolutionTheCoefficientsFade) {
+TEST(RefitIdentityRigid, WithoutASolutionTheCoefficientsFade) {
   Refit refit(TestSeed());
   const Pixels pixels = refit.view.Pixels({}, {});
   const Vector previous = {1, -2, 3, 0.1f, 0.7f, 0, 5, 6, 7, 8, 9, 10, 11, 12, 13, 1e-20f};
@@ -153,7 +153,7 @@ TEST(RefitIdentityRigidTest, WithoutASolutionTheCoefficientsFade) {
   EXPECT_TRUE(SameBits(coef, faded));
 }
 
-TEST(RefitExpressionRigidTest, WritesTheSolutionBitForBit) {
+TEST(RefitExpressionRigid, WritesTheSolutionBitForBit) {
   Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Refit refit(random.Next());
@@ -168,7 +168,7 @@ TEST(RefitExpressionRigidTest, WritesTheSolutionBitForBit) {
   }
 }
 
-TEST(RefitExpressionRigidTest, RecoversAKnownExpression) {
+TEST(RefitExpressionRigid, RecoversAKnownExpression) {
   Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     Refit refit(random.Next());
@@ -180,7 +180,7 @@ TEST(RefitExpressionRigidTest, RecoversAKnownExpression) {
   }
 }
 
-TEST(RefitExpressionRigidTest, OnlyTheSixtyLandmarksCount) {
+TEST(RefitExpressionRigid, OnlyTheSixtyLandmarksCount) {
   const Refit refit(TestSeed());
   const std::vector<int> used = ExpressionLandmarks();
   ASSERT_EQ(used.size(), 60u);
@@ -197,7 +197,7 @@ TEST(RefitExpressionRigidTest, OnlyTheSixtyLandmarksCount) {
   }
 }
 
-TEST(RefitExpressionRigidTest, WithoutASolutionTheCoefficientsStay) {
+TEST(RefitExpressionRigid, WithoutASolutionTheCoefficientsStay) {
   const Refit refit(TestSeed());
   const Pixels pixels = refit.view.Pixels({}, {});
   const std::vector<int16_t> flat(20 * kShapeSize, 0);
@@ -210,7 +210,7 @@ TEST(RefitExpressionRigidTest, WithoutASolutionTheCoefficientsStay) {
   EXPECT_EQ(coef, Vector(20, 7.0f));
 }
 
-TEST(RefitExpressionRigidTest, IsSkippedWithoutMeanShapeBasisOrCoefficients) {
+TEST(RefitExpressionRigid, IsSkippedWithoutMeanShapeBasisOrCoefficients) {
   const Refit refit(TestSeed());
   const Pixels pixels = refit.view.Pixels({}, Vector(20, 0.3f));
   Vector coef(20, 7.0f);
@@ -244,7 +244,7 @@ void ExpectFallbackOfEveryAllocation(const Vector& previous, const Vector& fallb
   EXPECT_GT(failures, 50);
 }
 
-TEST(RefitIdentityRigidTest, EveryFailedAllocationFadesTheCoefficients) {
+TEST(RefitIdentityRigid, EveryFailedAllocationFadesTheCoefficients) {
   const Refit refit(TestSeed());
   const Pixels pixels = refit.view.Pixels(Vector(16, 0.4f), {});
   const Vector previous(16, 1.0f);
@@ -253,7 +253,7 @@ TEST(RefitIdentityRigidTest, EveryFailedAllocationFadesTheCoefficients) {
       [&](MHandle memory, Vector* coef) { refit.Identity(memory, pixels, coef); });
 }
 
-TEST(RefitExpressionRigidTest, EveryFailedAllocationKeepsTheCoefficients) {
+TEST(RefitExpressionRigid, EveryFailedAllocationKeepsTheCoefficients) {
   const Refit refit(TestSeed());
   const Pixels pixels = refit.view.Pixels({}, Vector(20, 0.4f));
   const Vector previous(20, 1.0f);

@@ -127,7 +127,7 @@ double Distance(const Vector& a, const Vector& b) {
 
 // --- The definition --------------------------------------------------------------------------
 
-TEST(IdentityFitTest, EqualsTheRowwiseDefinitionBitForBit) {
+TEST(IdentityFit, EqualsTheRowwiseDefinitionBitForBit) {
   Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Fit fit(random.Next());
@@ -140,7 +140,7 @@ TEST(IdentityFitTest, EqualsTheRowwiseDefinitionBitForBit) {
   }
 }
 
-TEST(ExpressionFitTest, EqualsTheRowwiseDefinitionBitForBit) {
+TEST(ExpressionFit, EqualsTheRowwiseDefinitionBitForBit) {
   Random random = TestRandom();
   for (int run = 0; run < 30; ++run) {
     Fit fit(random.Next());
@@ -156,7 +156,7 @@ TEST(ExpressionFitTest, EqualsTheRowwiseDefinitionBitForBit) {
 
 // --- Known shapes ----------------------------------------------------------------------------
 
-TEST(IdentityFitTest, RecoversAKnownIdentityWhoseDepthsAreKnown) {
+TEST(IdentityFit, RecoversAKnownIdentityWhoseDepthsAreKnown) {
   Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     const Fit fit(random.Next());
@@ -167,7 +167,7 @@ TEST(IdentityFitTest, RecoversAKnownIdentityWhoseDepthsAreKnown) {
   }
 }
 
-TEST(ExpressionFitTest, RecoversAKnownExpressionOfAKnownPerson) {
+TEST(ExpressionFit, RecoversAKnownExpressionOfAKnownPerson) {
   Random random = TestRandom();
   for (int run = 0; run < 20; ++run) {
     Fit fit(random.Next());
@@ -181,14 +181,14 @@ TEST(ExpressionFitTest, RecoversAKnownExpressionOfAKnownPerson) {
   }
 }
 
-TEST(IdentityFitTest, MeanShapeHasNoCoefficients) {
+TEST(IdentityFit, MeanShapeHasNoCoefficients) {
   const Fit fit(TestSeed());
   Vector coef(16, 7.0f);
   ASSERT_EQ(fit.Identity(fit.view.Points({}, {}), &coef), N3DS_OK);
   for (const float c : coef) EXPECT_NEAR(c, 0, 1e-3);
 }
 
-TEST(ExpressionFitTest, MeanShapeHasNoCoefficients) {
+TEST(ExpressionFit, MeanShapeHasNoCoefficients) {
   const Fit fit(TestSeed());
   Vector coef(20, 7.0f);
   ASSERT_EQ(fit.Expression(fit.view.Pixels({}, {}), Vector(16, 0.0f), &coef), N3DS_OK);
@@ -196,7 +196,7 @@ TEST(ExpressionFitTest, MeanShapeHasNoCoefficients) {
   for (const float c : coef) EXPECT_NEAR(c, 0, 0.05);
 }
 
-TEST(ExpressionFitTest, TensorHasNoEffectOnAPersonWithoutCoefficients) {
+TEST(ExpressionFit, TensorHasNoEffectOnAPersonWithoutCoefficients) {
   Random random = TestRandom();
   const Fit fit(random.Next());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, RandomCoefficients(&random, 20, 0.5));
@@ -213,7 +213,7 @@ TEST(ExpressionFitTest, TensorHasNoEffectOnAPersonWithoutCoefficients) {
   EXPECT_TRUE(SameBits(coef, without));
 }
 
-TEST(ExpressionFitTest, PairsWithAnOddSumOfIndicesPlayNoPart) {
+TEST(ExpressionFit, PairsWithAnOddSumOfIndicesPlayNoPart) {
   Random random = TestRandom();
   const Fit fit(random.Next());
   const Vector person = RandomCoefficients(&random, 16, 0.5);
@@ -241,7 +241,7 @@ TEST(ExpressionFitTest, PairsWithAnOddSumOfIndicesPlayNoPart) {
 
 // --- Substituted landmarks -------------------------------------------------------------------
 
-TEST(ShapeFitSubstitutionTest, ObservationsOfSubstitutedLandmarksChangeNothing) {
+TEST(ShapeFitSubstitution, ObservationsOfSubstitutedLandmarksChangeNothing) {
   Random random = TestRandom();
   const Fit fit(random.Next());
   const Vector person = RandomCoefficients(&random, 16, 0.5);
@@ -267,7 +267,7 @@ TEST(ShapeFitSubstitutionTest, ObservationsOfSubstitutedLandmarksChangeNothing) 
   }
 }
 
-TEST(ShapeFitSubstitutionTest, DepthOfASubstitutedLandmarkCountsAllTheSame) {
+TEST(ShapeFitSubstitution, DepthOfASubstitutedLandmarkCountsAllTheSame) {
   const Fit fit(TestSeed());
   Vector points = fit.view.Points({}, {});
   Vector before(16), after(16);
@@ -277,7 +277,7 @@ TEST(ShapeFitSubstitutionTest, DepthOfASubstitutedLandmarkCountsAllTheSame) {
   EXPECT_GT(Distance(before, after), 1e-3);
 }
 
-TEST(ShapeFitSubstitutionTest, StandInMovesTheResultAsOftenAsItStands) {
+TEST(ShapeFitSubstitution, StandInMovesTheResultAsOftenAsItStands) {
   // Landmark 40 stands once; put it and a stand-in on the same vertex, and compare their pull.
   Random random = TestRandom();
   const struct {
@@ -303,7 +303,7 @@ TEST(ShapeFitSubstitutionTest, StandInMovesTheResultAsOftenAsItStands) {
 
 // --- Priors ----------------------------------------------------------------------------------
 
-TEST(IdentityFitTest, LargerPicturesHoldTheDepthMoreFirmly) {
+TEST(IdentityFit, LargerPicturesHoldTheDepthMoreFirmly) {
   Random random = TestRandom();
   Fit fit(random.Next());
   const Vector truth = RandomCoefficients(&random, 16, 0.5);
@@ -326,7 +326,7 @@ TEST(IdentityFitTest, LargerPicturesHoldTheDepthMoreFirmly) {
   }
 }
 
-TEST(ExpressionFitTest, LargerPicturesPullHarderTowardZero) {
+TEST(ExpressionFit, LargerPicturesPullHarderTowardZero) {
   Random random = TestRandom();
   Fit fit(random.Next());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, RandomCoefficients(&random, 20, 0.5));
@@ -343,7 +343,7 @@ TEST(ExpressionFitTest, LargerPicturesPullHarderTowardZero) {
 
 // --- Failures --------------------------------------------------------------------------------
 
-TEST(IdentityFitTest, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
+TEST(IdentityFit, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
   const Fit fit(TestSeed());
   const std::vector<int16_t> flat(16 * kShapeSize, 0);  // no identity moves anything
   const Vector points = fit.view.Points({}, {});
@@ -358,7 +358,7 @@ TEST(IdentityFitTest, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
   EXPECT_EQ(coef, Vector(16, 7.0f));
 }
 
-TEST(ExpressionFitTest, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
+TEST(ExpressionFit, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
   Fit fit(TestSeed());
   const std::vector<int16_t> flat(20 * kShapeSize, 0);
   const std::vector<int32_t> pixels(190, 100);
@@ -375,7 +375,7 @@ TEST(ExpressionFitTest, SingularSystemReturnsZeroAndKeepsTheCoefficients) {
   EXPECT_EQ(coef, Vector(20, 7.0f));
 }
 
-TEST(ShapeFitTest, LandmarksAtOnePixelDoNoHarm) {
+TEST(ShapeFit, LandmarksAtOnePixelDoNoHarm) {
   const Fit fit(TestSeed());
   Vector points;
   for (int i = 0; i < 95; ++i) points.insert(points.end(), {640, 360, 600});
@@ -386,7 +386,7 @@ TEST(ShapeFitTest, LandmarksAtOnePixelDoNoHarm) {
   for (const float c : expression) EXPECT_TRUE(std::isfinite(c));
 }
 
-TEST(IdentityFitTest, NullPointersAreRefusedAndNothingIsWritten) {
+TEST(IdentityFit, NullPointersAreRefusedAndNothingIsWritten) {
   const Fit fit(TestSeed());
   const Vector points = fit.view.Points({}, {});
   const MemoryPool pool(64);  // an allocation would give -201
@@ -404,7 +404,7 @@ TEST(IdentityFitTest, NullPointersAreRefusedAndNothingIsWritten) {
   }
 }
 
-TEST(ExpressionFitTest, NullPointersAreRefusedAndNothingIsWritten) {
+TEST(ExpressionFit, NullPointersAreRefusedAndNothingIsWritten) {
   const Fit fit(TestSeed());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, {});
   const Vector person(16, 0.0f);
@@ -454,7 +454,7 @@ void ExpectCleanFailureOfEveryAllocation(size_t system_floats, int count, Solve 
   EXPECT_GT(no_scratch, 10);
 }
 
-TEST(IdentityFitTest, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) {
+TEST(IdentityFit, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) {
   Fit fit(TestSeed());
   const Vector points = fit.view.Points(Vector(16, 0.2f), {});
   ExpectCleanFailureOfEveryAllocation(266 * 17, 16, [&](MHandle memory, Vector* coef) {
@@ -463,7 +463,7 @@ TEST(IdentityFitTest, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) {
   });
 }
 
-TEST(ExpressionFitTest, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) {
+TEST(ExpressionFit, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) {
   Fit fit(TestSeed());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, Vector(20, 0.2f));
   ExpectCleanFailureOfEveryAllocation(210 * 21, 20, [&](MHandle memory, Vector* coef) {
@@ -472,7 +472,7 @@ TEST(ExpressionFitTest, EveryFailedAllocationIsReportedOrLeavesTheCoefficients) 
   });
 }
 
-TEST(ShapeFitTest, GoldenCoefficientsOnEveryMachine) {
+TEST(ShapeFit, GoldenCoefficientsOnEveryMachine) {
   Random random(7);
   uint32_t hash = 2166136261u;
   for (int run = 0; run < 20; ++run) {

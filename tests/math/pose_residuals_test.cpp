@@ -97,7 +97,7 @@ const Pose kFrontal = MakePose(0.1f, 0.2f, -0.05f, 10, -20, 700);
 
 // --- The definition --------------------------------------------------------------------------
 
-TEST(ComputeJacobianEtcTest, EqualsTheElementwiseDefinitionBitForBit) {
+TEST(ComputeJacobianEtc, EqualsTheElementwiseDefinitionBitForBit) {
   Random random = TestRandom();
   std::map<OutlineRule, int> seen;
   for (int run = 0; run < 600; ++run) {
@@ -125,7 +125,7 @@ TEST(ComputeJacobianEtcTest, EqualsTheElementwiseDefinitionBitForBit) {
   }
 }
 
-TEST(ComputeJacobianEtcTest, JacobianMatchesCentralDifferencesUnderEveryWeighting) {
+TEST(ComputeJacobianEtc, JacobianMatchesCentralDifferencesUnderEveryWeighting) {
   Random random = TestRandom();
   std::map<std::pair<OutlineRule, bool>, int> seen;
   for (int run = 0; run < 120; ++run) {
@@ -171,7 +171,7 @@ TEST(ComputeJacobianEtcTest, JacobianMatchesCentralDifferencesUnderEveryWeightin
   }
 }
 
-TEST(ComputeJacobianEtcTest, ExactFitHasNoResidualAndNoGradient) {
+TEST(ComputeJacobianEtc, ExactFitHasNoResidualAndNoGradient) {
   // Points whose projections are whole numbers: depth 512, focal length 1024.
   PoseCase c;
   c.camera = {1024, 0, 640, 0, 1024, 360, 0, 0, 1};
@@ -186,7 +186,7 @@ TEST(ComputeJacobianEtcTest, ExactFitHasNoResidualAndNoGradient) {
   EXPECT_EQ(e.g, std::vector<float>(7, 0.0f));
 }
 
-TEST(ComputeJacobianEtcTest, QuaternionLengthScalesTheModel) {
+TEST(ComputeJacobianEtc, QuaternionLengthScalesTheModel) {
   PoseCase c = ExactCase(kFrontal);
   Pose doubled = kFrontal;
   for (int i = 0; i < 4; ++i) doubled[i] *= 2;
@@ -196,7 +196,7 @@ TEST(ComputeJacobianEtcTest, QuaternionLengthScalesTheModel) {
 
 // --- Weights by landmark ---------------------------------------------------------------------
 
-TEST(PoseWeightsTest, WithTheModeOffOnlyTheRangeRuleApplies) {
+TEST(ResidualWeights, WithTheModeOffOnlyTheRangeRuleApplies) {
   PoseCase c = ExactCase(kFrontal);
   c.inner_weight = 0.25f;
   c.range_weight = 0.5f;
@@ -207,7 +207,7 @@ TEST(PoseWeightsTest, WithTheModeOffOnlyTheRangeRuleApplies) {
   }
 }
 
-TEST(PoseWeightsTest, WithTheModeOnEachLandmarkHasItsFactor) {
+TEST(ResidualWeights, WithTheModeOnEachLandmarkHasItsFactor) {
   PoseCase c = ExactCase(kFrontal);
   for (const int64_t mode : {int64_t{1}, int64_t{-1}, int64_t{1} << 40}) {
     for (const float inner : {0.25f, 4.0f}) {
@@ -224,28 +224,28 @@ TEST(PoseWeightsTest, WithTheModeOnEachLandmarkHasItsFactor) {
   }
 }
 
-TEST(PoseWeightsTest, LandmarkTwentyCountsATenthOnlyWithTheMode) {
+TEST(ResidualWeights, LandmarkTwentyCountsATenthOnlyWithTheMode) {
   PoseCase c = ExactCase(kFrontal);
   EXPECT_EQ(FactorOf(20, c, kFrontal), 1.0f);
   c.mode = 1;
   EXPECT_NEAR(FactorOf(20, c, kFrontal), 0.1f, 1e-6);
 }
 
-TEST(PoseWeightsTest, InnerWeightOfOneLeavesTheNoseUnscaled) {
+TEST(ResidualWeights, InnerWeightOfOneLeavesTheNoseUnscaled) {
   PoseCase c = ExactCase(kFrontal);
   c.mode = 1;
   c.inner_weight = 1;
   for (const int i : {63, 64, 65, 68, 69, 72, 73, 74}) EXPECT_EQ(FactorOf(i, c, kFrontal), 1.0f);
 }
 
-TEST(PoseWeightsTest, ModeAndRangeMultiply) {
+TEST(ResidualWeights, ModeAndRangeMultiply) {
   PoseCase c = ExactCase(kFrontal);
   c.mode = 1;
   c.range_weight = 0.5f;
   EXPECT_NEAR(FactorOf(90, c, kFrontal), 0.05f, 1e-6);
 }
 
-TEST(PoseWeightsTest, NumbersCountFromTheFirstPointPassed) {
+TEST(ResidualWeights, NumbersCountFromTheFirstPointPassed) {
   // A fit without the 19 outline points: what is passed at 39 has the factor of an eye corner.
   PoseCase c = ExactCase(kFrontal);
   c.landmarks.erase(c.landmarks.begin(), c.landmarks.begin() + 2 * 19);
@@ -255,7 +255,7 @@ TEST(PoseWeightsTest, NumbersCountFromTheFirstPointPassed) {
   EXPECT_NEAR(FactorOf(39 - 19, c, kFrontal), 0.1f, 1e-6);
 }
 
-TEST(PoseWeightsTest, LandmarksBeyondTheLastAreOrdinary) {
+TEST(ResidualWeights, LandmarksBeyondTheLastAreOrdinary) {
   PoseCase c = ExactCase(kFrontal);
   for (int i = 0; i < 10; ++i) {
     for (int k = 0; k < 3; ++k) c.model.push_back(c.model[3 * 50 + k]);
@@ -299,7 +299,7 @@ struct OutlineProbe {
   }
 };
 
-TEST(OutlineRuleTest, ProjectionNearerTheMiddleThanTheObservationKeepsItsResidual) {
+TEST(OutlineRule, ProjectionNearerTheMiddleThanTheObservationKeepsItsResidual) {
   // The horizontal line lies below the temple, so observing it higher is farther from the line.
   for (const Line line : {Line::kVertical, Line::kOblique, Line::kHorizontal}) {
     const OutlineProbe probe(6, line == Line::kHorizontal ? -2.0f : 2.0f, line);
@@ -310,7 +310,7 @@ TEST(OutlineRuleTest, ProjectionNearerTheMiddleThanTheObservationKeepsItsResidua
   }
 }
 
-TEST(OutlineRuleTest, VerticalLineCountsTheHorizontalDistanceTwice) {
+TEST(OutlineRule, VerticalLineCountsTheHorizontalDistanceTwice) {
   const OutlineProbe probe(-6, 2, Line::kVertical);
   for (int row = 0; row < 2; ++row) {
     EXPECT_EQ(probe.r[row], 0.5f * probe.plain_r[0]);
@@ -319,7 +319,7 @@ TEST(OutlineRuleTest, VerticalLineCountsTheHorizontalDistanceTwice) {
   EXPECT_NE(probe.r[0], 0.0f);
 }
 
-TEST(OutlineRuleTest, HorizontalLineCountsTheVerticalDistanceTwice) {
+TEST(OutlineRule, HorizontalLineCountsTheVerticalDistanceTwice) {
   const OutlineProbe probe(-6, 4, Line::kHorizontal);
   for (int row = 0; row < 2; ++row) {
     EXPECT_EQ(probe.r[row], 0.5f * probe.plain_r[1]);
@@ -328,7 +328,7 @@ TEST(OutlineRuleTest, HorizontalLineCountsTheVerticalDistanceTwice) {
   EXPECT_NE(probe.r[0], 0.0f);
 }
 
-TEST(OutlineRuleTest, ObliqueLineProjectsOntoItsNormal) {
+TEST(OutlineRule, ObliqueLineProjectsOntoItsNormal) {
   const OutlineProbe probe(-6, 2, Line::kOblique);
   const ReferenceLine line = ReferenceMiddleLine(probe.c);
   const double dx = line.bx - line.ax, dy = line.by - line.ay;
@@ -346,7 +346,7 @@ TEST(OutlineRuleTest, ObliqueLineProjectsOntoItsNormal) {
   }
 }
 
-TEST(OutlineRuleTest, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
+TEST(OutlineRule, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
   PoseCase c = ExactCase(kFrontal);
   c.landmarks[2 * 9] = static_cast<float>(ReferenceMiddleLine(c).bx);
   // Every landmark observed nearer the middle line, a vertical one, than it projects.
@@ -364,7 +364,7 @@ TEST(OutlineRuleTest, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
   }
 }
 
-TEST(OutlineRuleTest, LineHangsOnTruncatedObservationsAndMixedEyeCornerCoordinates) {
+TEST(OutlineRule, LineHangsOnTruncatedObservationsAndMixedEyeCornerCoordinates) {
   // B is (trunc(x51 + x45) / 2, trunc(x51 + y45 + 1) / 2): the line is vertical when the chin's
   // truncated x equals the first, whatever the fraction.
   PoseCase c = ExactCase(kFrontal);
@@ -393,7 +393,7 @@ TEST(OutlineRuleTest, LineHangsOnTruncatedObservationsAndMixedEyeCornerCoordinat
   EXPECT_EQ(Residuals(c, kFrontal)[0], horizontal[0]);
 }
 
-TEST(OutlineRuleTest, WithoutTheEyeCornersThereIsNoLine) {
+TEST(OutlineRule, WithoutTheEyeCornersThereIsNoLine) {
   // 51 points do not reach landmark 51; nothing beyond the array may be read.
   PoseCase c = ExactCase(kFrontal);
   c.landmarks.resize(2 * 51);
@@ -404,7 +404,7 @@ TEST(OutlineRuleTest, WithoutTheEyeCornersThereIsNoLine) {
   EXPECT_TRUE(SameBits(Residuals(c, kFrontal), r));
 }
 
-TEST(OutlineRuleTest, FiftyTwoPointsReachTheEyeCorners) {
+TEST(OutlineRule, FiftyTwoPointsReachTheEyeCorners) {
   PoseCase c = ExactCase(kFrontal);
   c.landmarks.resize(2 * 52);
   c.model.resize(3 * 52);
@@ -417,7 +417,7 @@ TEST(OutlineRuleTest, FiftyTwoPointsReachTheEyeCorners) {
 }
 
 // The temple is projected to (520, 360) and observed as far on the other side of the line.
-TEST(OutlineRuleTest, ObservationAsFarFromTheLineAsTheProjectionKeepsItsResidual) {
+TEST(OutlineRule, ObservationAsFarFromTheLineAsTheProjectionKeepsItsResidual) {
   struct Place {
     float chin_x, chin_y, left_x, left_y, right_x, observed_x, observed_y;
   };
@@ -446,7 +446,7 @@ TEST(OutlineRuleTest, ObservationAsFarFromTheLineAsTheProjectionKeepsItsResidual
   }
 }
 
-TEST(OutlineRuleTest, LandmarksBeyondTheRangeOfIntegersAreHarmless) {
+TEST(OutlineRule, LandmarksBeyondTheRangeOfIntegersAreHarmless) {
   constexpr float kHuge = 3e38f;
   const float values[] = {kHuge,         -kHuge,        std::numeric_limits<float>::infinity(),
                           std::nanf(""), 2147483648.0f, -2147483648.0f};
@@ -474,7 +474,7 @@ PoseCase PointAtDepth(float depth) {
 }
 constexpr Pose kIdentityPose = {1, 0, 0, 0, 0, 0, 0};
 
-TEST(ZeroDepthTest, PointOnTheCameraPlaneFailsAndPrintsOneLine) {
+TEST(ZeroDepth, PointOnTheCameraPlaneFailsAndPrintsOneLine) {
   const PoseCase c = PointAtDepth(0);
   Evaluation e;
   EXPECT_EQ(PrintedBy([&] { e = Evaluate(c, kIdentityPose); }), "zero in zc\n");
@@ -493,7 +493,7 @@ TEST(ZeroDepthTest, PointOnTheCameraPlaneFailsAndPrintsOneLine) {
             "zero in zc\n");
 }
 
-TEST(ZeroDepthTest, PointsBeforeTheOneWithoutDepthAreWritten) {
+TEST(ZeroDepth, PointsBeforeTheOneWithoutDepthAreWritten) {
   constexpr Pose kSquare = {1, 0, 0, 0, 0, 0, 512};
   const PoseCase good = ExactCase(kSquare);
   for (const int32_t params : {3, 7, 9}) {
@@ -518,7 +518,7 @@ TEST(ZeroDepthTest, PointsBeforeTheOneWithoutDepthAreWritten) {
   }
 }
 
-TEST(ZeroDepthTest, LimitIsComparedInDouble) {
+TEST(ZeroDepth, LimitIsComparedInDouble) {
   const auto status_at = [](float depth) {
     Evaluation e;
     PrintedBy([&] { e = Evaluate(PointAtDepth(depth), kIdentityPose); });
@@ -530,7 +530,7 @@ TEST(ZeroDepthTest, LimitIsComparedInDouble) {
   EXPECT_EQ(status_at(-2e-6f), N3DS_OK);
 }
 
-TEST(ZeroDepthTest, PointBehindTheCameraIsProjectedAllTheSame) {
+TEST(ZeroDepth, PointBehindTheCameraIsProjectedAllTheSame) {
   const Evaluation e = Evaluate(PointAtDepth(-5), kIdentityPose);
   EXPECT_EQ(e.status, N3DS_OK);
   EXPECT_EQ(e.r[2], 560.0f * 4 / -5 + 320);
@@ -554,7 +554,7 @@ struct Arguments {
   }
 };
 
-TEST(ComputeJacobianEtcTest, MixOfNullAndSetOutputsComesFirstThenNullsThenSizes) {
+TEST(ComputeJacobianEtc, MixOfNullAndSetOutputsComesFirstThenNullsThenSizes) {
   Arguments a;
   for (unsigned null = 0; null < 256; ++null) {
     const unsigned outputs = null & 7, inputs = null >> 3;
@@ -567,20 +567,20 @@ TEST(ComputeJacobianEtcTest, MixOfNullAndSetOutputsComesFirstThenNullsThenSizes)
   }
 }
 
-TEST(ComputeJacobianEtcTest, CountsWithoutAnIntegerForTheirRowsAreRefused) {
+TEST(ComputeJacobianEtc, CountsWithoutAnIntegerForTheirRowsAreRefused) {
   Arguments a;
   EXPECT_EQ(a.Call(0, 1 << 30), N3DS_BAD_VALUE);
   EXPECT_EQ(a.Call(0, INT32_MAX), N3DS_BAD_VALUE);
 }
 
-TEST(ComputeJacobianEtcTest, NoPointsGiveZeroNormalEquations) {
+TEST(ComputeJacobianEtc, NoPointsGiveZeroNormalEquations) {
   Arguments a;
   EXPECT_EQ(a.Call(0, 0), N3DS_OK);
   for (const float v : a.JtJ) EXPECT_EQ(v, 0.0f);
   for (const float v : a.g) EXPECT_EQ(v, 0.0f);
 }
 
-TEST(ComputeJacobianEtcTest, FewerParametersGetOnlyTheirColumns) {
+TEST(ComputeJacobianEtc, FewerParametersGetOnlyTheirColumns) {
   Random random = TestRandom();
   const PoseCase c = RandomCase(random, kFrontal, Line::kOblique, 8);
   const Evaluation full = Evaluate(c, kFrontal);
@@ -598,7 +598,7 @@ TEST(ComputeJacobianEtcTest, FewerParametersGetOnlyTheirColumns) {
   }
 }
 
-TEST(ComputeJacobianEtcTest, ColumnsBeyondTheSeventhAreOnlyWeighted) {
+TEST(ComputeJacobianEtc, ColumnsBeyondTheSeventhAreOnlyWeighted) {
   Random random = TestRandom();
   const PoseCase c = RandomCase(random, kFrontal, Line::kOblique, 8);
   const Evaluation full = Evaluate(c, kFrontal);
@@ -625,7 +625,7 @@ TEST(ComputeJacobianEtcTest, ColumnsBeyondTheSeventhAreOnlyWeighted) {
   EXPECT_EQ(e.g[17], g);
 }
 
-TEST(ComputeJacobianEtcTest, TransposeThatCannotBeHadIsReported) {
+TEST(ComputeJacobianEtc, TransposeThatCannotBeHadIsReported) {
   const PoseCase c = ExactCase(kFrontal);
   const size_t needed = 7 * 190 * sizeof(float) + 32;
   const MemoryPool small(needed - 8), enough(needed);

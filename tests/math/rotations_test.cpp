@@ -82,19 +82,19 @@ std::array<double, 9> MatrixOfEuler(double roll, double pitch, double yaw) {
           cp * cr};
 }
 
-TEST(QuatToRotationMatrixTest, IdentityGivesIdentity) {
+TEST(QuatToRotationMatrix, IdentityGivesIdentity) {
   EXPECT_EQ(MatrixOf({1, 0, 0, 0}), (Mat3{1, 0, 0, 0, 1, 0, 0, 0, 1}));
 }
 
-TEST(QuatToRotationMatrixTest, QuaternionOfLengthTwoScalesByFour) {
+TEST(QuatToRotationMatrix, QuaternionOfLengthTwoScalesByFour) {
   EXPECT_EQ(MatrixOf({2, 0, 0, 0}), (Mat3{4, 0, 0, 0, 4, 0, 0, 0, 4}));
 }
 
-TEST(QuatToRotationMatrixTest, ZeroQuaternionGivesZeroMatrix) {
+TEST(QuatToRotationMatrix, ZeroQuaternionGivesZeroMatrix) {
   EXPECT_EQ(MatrixOf({0, 0, 0, 0}), (Mat3{}));
 }
 
-TEST(QuatToRotationMatrixTest, TurnsColumnVectorsAsTheQuaternionDoes) {
+TEST(QuatToRotationMatrix, TurnsColumnVectorsAsTheQuaternionDoes) {
   Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     const Quat q = RandomUnitQuat(random);
@@ -108,7 +108,7 @@ TEST(QuatToRotationMatrixTest, TurnsColumnVectorsAsTheQuaternionDoes) {
   }
 }
 
-TEST(QuatToRotationMatrixTest, AnyLengthScalesAllNineElementsByItsSquare) {
+TEST(QuatToRotationMatrix, AnyLengthScalesAllNineElementsByItsSquare) {
   Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     const Quat q = RandomUnitQuat(random);
@@ -119,17 +119,17 @@ TEST(QuatToRotationMatrixTest, AnyLengthScalesAllNineElementsByItsSquare) {
   }
 }
 
-TEST(RotationMatrixToQuatTest, IdentityGivesIdentity) {
+TEST(RotationMatrixToQuat, IdentityGivesIdentity) {
   EXPECT_EQ(QuatOf({1, 0, 0, 0, 1, 0, 0, 0, 1}), (Quat{1, 0, 0, 0}));
 }
 
-TEST(RotationMatrixToQuatTest, HalfTurnsGiveTheirAxis) {
+TEST(RotationMatrixToQuat, HalfTurnsGiveTheirAxis) {
   EXPECT_EQ(QuatOf({1, 0, 0, 0, -1, 0, 0, 0, -1}), (Quat{0, 1, 0, 0}));
   EXPECT_EQ(QuatOf({-1, 0, 0, 0, 1, 0, 0, 0, -1}), (Quat{0, 0, 1, 0}));
   EXPECT_EQ(QuatOf({-1, 0, 0, 0, -1, 0, 0, 0, 1}), (Quat{0, 0, 0, 1}));
 }
 
-TEST(RotationMatrixToQuatTest, TiesGoToTheEarlierComponent) {
+TEST(RotationMatrixToQuat, TiesGoToTheEarlierComponent) {
   // A quarter turn about x: w and x are alike, and w^2 comes first. Had x been chosen, the signs
   // would be those of x > 0, so turn the other way, where w > 0 means x < 0.
   const Quat w_and_x = QuatOf({1, 0, 0, 0, 0, 1, 0, -1, 0});
@@ -145,7 +145,7 @@ TEST(RotationMatrixToQuatTest, TiesGoToTheEarlierComponent) {
   EXPECT_LT(y_and_z[3], 0);
 }
 
-TEST(RotationMatrixToQuatTest, RoundTripsWithTheLargestComponentPositive) {
+TEST(RotationMatrixToQuat, RoundTripsWithTheLargestComponentPositive) {
   Random random = TestRandom();
   int chosen[4] = {};
   for (int run = 0; run < 400; ++run) {
@@ -164,12 +164,12 @@ TEST(RotationMatrixToQuatTest, RoundTripsWithTheLargestComponentPositive) {
   for (const int count : chosen) EXPECT_GT(count, 20);
 }
 
-TEST(QuatToEulerTest, QuarterTurnAboutYIsPitchOfARightAngle) {
+TEST(QuatToEuler, QuarterTurnAboutYIsPitchOfARightAngle) {
   const float c = static_cast<float>(std::cos(kPi / 4)), s = static_cast<float>(std::sin(kPi / 4));
   EXPECT_NEAR(EulerOf({c, 0, s, 0})[1], kPi / 2, 1e-3);
 }
 
-TEST(QuatToEulerTest, LongerQuaternionNearGimbalLockHasNoPitch) {
+TEST(QuatToEuler, LongerQuaternionNearGimbalLockHasNoPitch) {
   const float c = static_cast<float>(std::cos(kPi / 4) * 1.001);
   const Vec3 euler = EulerOf({c, 0, c, 0});
   EXPECT_TRUE(std::isnan(euler[1]));
@@ -177,7 +177,7 @@ TEST(QuatToEulerTest, LongerQuaternionNearGimbalLockHasNoPitch) {
   EXPECT_FALSE(std::isnan(euler[2]));
 }
 
-TEST(QuatToEulerTest, AnglesStandInTheOrderRollPitchYaw) {
+TEST(QuatToEuler, AnglesStandInTheOrderRollPitchYaw) {
   const float c = static_cast<float>(std::cos(0.1)), s = static_cast<float>(std::sin(0.1));
   for (int axis = 0; axis < 3; ++axis) {
     Quat q = {c, 0, 0, 0};
@@ -187,7 +187,7 @@ TEST(QuatToEulerTest, AnglesStandInTheOrderRollPitchYaw) {
   }
 }
 
-TEST(EulerToQuatTest, BuildsRollThenPitchThenYaw) {
+TEST(EulerToQuat, BuildsRollThenPitchThenYaw) {
   Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     const Vec3 e = {random.Float(-3.1f, 3.1f), random.Float(-3.1f, 3.1f),
@@ -198,7 +198,7 @@ TEST(EulerToQuatTest, BuildsRollThenPitchThenYaw) {
   }
 }
 
-TEST(EulerToQuatTest, RoundTripsThroughEulerForPitchInsideARightAngle) {
+TEST(EulerToQuat, RoundTripsThroughEulerForPitchInsideARightAngle) {
   Random random = TestRandom();
   for (int run = 0; run < 400; ++run) {
     const Vec3 e = {random.Float(-3.14f, 3.14f), random.Float(-1.5f, 1.5f),
@@ -210,14 +210,14 @@ TEST(EulerToQuatTest, RoundTripsThroughEulerForPitchInsideARightAngle) {
   }
 }
 
-TEST(MatrixInverse3X3Test, DiagonalInvertsExactly) {
+TEST(MatrixInverse3X3, DiagonalInvertsExactly) {
   const Mat3 m = {2, 0, 0, 0, 4, 0, 0, 0, 8};
   Mat3 inverse;
   ASSERT_EQ(MatrixInverse3X3(m.data(), inverse.data()), N3DS_OK);
   EXPECT_EQ(inverse, (Mat3{0.5f, 0, 0, 0, 0.25f, 0, 0, 0, 0.125f}));
 }
 
-TEST(MatrixInverse3X3Test, ZeroRowIsSingularAndWritesNothing) {
+TEST(MatrixInverse3X3, ZeroRowIsSingularAndWritesNothing) {
   const Mat3 m = {1, 2, 3, 0, 0, 0, 7, 8, 10};
   Mat3 inverse;
   inverse.fill(kUnwritten);
@@ -225,14 +225,14 @@ TEST(MatrixInverse3X3Test, ZeroRowIsSingularAndWritesNothing) {
   for (const float v : inverse) EXPECT_EQ(v, kUnwritten);
 }
 
-TEST(MatrixInverse3X3Test, TinyDeterminantIsStillInverted) {
+TEST(MatrixInverse3X3, TinyDeterminantIsStillInverted) {
   const Mat3 m = {1e-12f, 0, 0, 0, 1e-12f, 0, 0, 0, 1e-12f};
   Mat3 inverse;
   ASSERT_EQ(MatrixInverse3X3(m.data(), inverse.data()), N3DS_OK);
   EXPECT_NEAR(inverse[0], 1e12f, 1e7f);
 }
 
-TEST(MatrixInverse3X3Test, ProductWithTheInverseIsTheIdentity) {
+TEST(MatrixInverse3X3, ProductWithTheInverseIsTheIdentity) {
   Random random = TestRandom();
   for (int run = 0; run < 200; ++run) {
     // Diagonally dominant, so well conditioned.
@@ -250,7 +250,7 @@ TEST(MatrixInverse3X3Test, ProductWithTheInverseIsTheIdentity) {
   }
 }
 
-TEST(RotationsTest, NonFiniteInputPropagates) {
+TEST(Rotations, NonFiniteInputPropagates) {
   EXPECT_TRUE(std::isnan(MatrixOf({kNan, 0, 0, 0})[0]));
   EXPECT_TRUE(std::isnan(QuatOf({kNan, 0, 0, 0, 1, 0, 0, 0, 1})[0]));
   EXPECT_TRUE(std::isnan(EulerOf({kNan, 0, 0, 0})[0]));
@@ -261,7 +261,7 @@ TEST(RotationsTest, NonFiniteInputPropagates) {
   EXPECT_TRUE(std::isnan(inverse[0]));
 }
 
-TEST(RotationsTest, InputAndOutputMayBeTheSameArray) {
+TEST(Rotations, InputAndOutputMayBeTheSameArray) {
   const Quat q = {0.9f, 0.1f, -0.3f, 0.2f};
   Mat3 shared = {q[0], q[1], q[2], q[3]};
   QuatToRotationMatrix(shared.data(), shared.data());
@@ -289,7 +289,7 @@ TEST(RotationsTest, InputAndOutputMayBeTheSameArray) {
   EXPECT_EQ(shared, apart);
 }
 
-TEST(RotationsTest, NullPointersAreRefusedAndNothingIsWritten) {
+TEST(Rotations, NullPointersAreRefusedAndNothingIsWritten) {
   const Mat3 in = {1, 0, 0, 0, 1, 0, 0, 0, 1};
   using Function = MRESULT (*)(const float*, float*);
   for (const Function function :

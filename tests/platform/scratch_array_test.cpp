@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <vector>
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
 
 struct Record {
@@ -51,4 +51,4 @@ TEST(ScratchArray, IsEmptyForSizesBeyondTheAddressSpace) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing

@@ -11,12 +11,12 @@
 #include <vector>
 
 #include "platform/integer_arithmetic.h"
-#include "platform/kernel_testing.h"
+#include "support/bits.h"
+#include "support/guarded_array.h"
+#include "support/test_random.h"
 
-namespace n3ds {
+namespace n3ds::testing {
 namespace {
-
-using testing::SameBits;
 
 using Floats = std::array<float, 4>;
 using Integers = std::array<int32_t, 4>;
@@ -53,7 +53,7 @@ Integers Lanes(I32x4 a) {
 
 void ExpectSame(const Floats& actual, const Floats& expected) {
   for (size_t i = 0; i < 4; ++i) {
-    EXPECT_TRUE(SameBits(actual[i], expected[i]))
+    EXPECT_TRUE(SameBitsOrNan(actual[i], expected[i]))
         << "lane " << i << ": " << actual[i] << " instead of " << expected[i];
   }
 }
@@ -109,8 +109,8 @@ TEST(Simd, DisablingItTurnsAllOfItOff) {
 }
 
 TEST(Simd, FloatsAreLoadedStoredAndSpread) {
-  testing::GuardedArray<float> values(std::vector<float>{1, -2, kNaN, -0.0f, 5});
-  testing::GuardedArray<float> out(4);
+  GuardedArray<float> values(std::vector<float>{1, -2, kNaN, -0.0f, 5});
+  GuardedArray<float> out(4);
   F32x4::Load(values.data() + 1).Store(out.data());
   ExpectSame({out[0], out[1], out[2], out[3]}, {-2, kNaN, -0.0f, 5});
   ExpectSame(Lanes(F32x4::Splat(-0.0f)), {-0.0f, -0.0f, -0.0f, -0.0f});
@@ -193,7 +193,7 @@ TEST(Simd, IntegersWrapAndConvert) {
 }
 
 TEST(Simd, TwoOfThreeAreTakenApart) {
-  testing::GuardedArray<int32_t> triples(12);
+  GuardedArray<int32_t> triples(12);
   for (size_t i = 0; i < 12; ++i) triples[i] = static_cast<int32_t>(i * 0x10000001u);
   I32x4 first, second;
   LoadFirstTwoOfThree(triples.data(), &first, &second);
@@ -206,7 +206,7 @@ TEST(Simd, TwoOfThreeAreTakenApart) {
 // All pairs of the extremes, so that both products and their sum pass 31 bits.
 TEST(Simd, ShortsWidenAndTheirProductsWrap) {
   constexpr int16_t kExtremes[] = {INT16_MIN, INT16_MIN + 1, -1, 0, 1, 1234, INT16_MAX};
-  testing::RandomValues random(16);
+  Random random = TestRandom();
   for (const int16_t s : kExtremes) {
     for (const int16_t t : kExtremes) {
       std::vector<int16_t> a = random.Integers<int16_t>(8), b = random.Integers<int16_t>(8);
@@ -225,8 +225,8 @@ TEST(Simd, ShortsWidenAndTheirProductsWrap) {
 }
 
 TEST(Simd, BytesBecomeFloatsAndBack) {
-  testing::GuardedArray<uint8_t> bytes(8);
-  testing::GuardedArray<uint8_t> out(4);
+  GuardedArray<uint8_t> bytes(8);
+  GuardedArray<uint8_t> out(4);
   for (int first = 0; first < 256; first += 8) {
     for (size_t i = 0; i < 8; ++i) bytes[i] = static_cast<uint8_t>(first + static_cast<int>(i));
     F32x4 low, high;
@@ -243,7 +243,7 @@ TEST(Simd, BytesBecomeFloatsAndBack) {
 TEST(Simd, StoredBytesTruncateAndSaturate) {
   for (size_t s = 0; s < kSpecialCount; ++s) {
     const Floats a = Special(s);
-    testing::GuardedArray<uint8_t> out(4);
+    GuardedArray<uint8_t> out(4);
     StoreBytes(Load(a), out.data());
     for (size_t i = 0; i < 4; ++i) {
       const int expected = a[i] >= 255.0f ? 255 : a[i] > 0.0f ? static_cast<int>(a[i]) : 0;
@@ -253,4 +253,4 @@ TEST(Simd, StoredBytesTruncateAndSaturate) {
 }
 
 }  // namespace
-}  // namespace n3ds
+}  // namespace n3ds::testing
