@@ -206,9 +206,11 @@ TEST_F(CpuSwitch, PathTooLongIsAMissingSwitch) {
 }
 
 TEST_F(CpuSwitch, NullPoolIsIgnored) {
+  MakeCores("10");
+  MakePool(2, 1);
   mcvTryFireCpu(nullptr);
   mcvTryRestoreCpu(nullptr);
-  MakePool(1, 1);
+  EXPECT_EQ(States(2), "10");
 }
 
 }  // namespace
