@@ -10,46 +10,44 @@
 
 namespace n3ds {
 
-// rows x columns coefficients and a right-hand side, with values that are not set. False without
+// rows x kColumns coefficients and a right-hand side, with values that are not set. False without
 // memory.
+template <int kColumns>
 class LinearSystem {
  public:
-  LinearSystem(MHandle memory, int rows, int columns)
+  LinearSystem(MHandle memory, int rows)
       : memory_(memory),
         rows_(rows),
-        columns_(columns),
-        coefficients_(memory, static_cast<size_t>(rows) * static_cast<size_t>(columns)),
+        coefficients_(memory, static_cast<size_t>(rows) * kColumns),
         right_side_(memory, static_cast<size_t>(rows)) {}
 
   explicit operator bool() const { return coefficients_ && right_side_; }
 
-  float* Row(int row) const { return coefficients_.get() + static_cast<ptrdiff_t>(row) * columns_; }
+  float* Row(int row) const { return coefficients_.get() + static_cast<ptrdiff_t>(row) * kColumns; }
   float& RightSide(int row) const { return right_side_.get()[row]; }
 
-  // Sets row `to` to what row `from` says.
-  void CopyRow(int from, int to) const {
-    std::copy_n(Row(from), columns_, Row(to));
-    RightSide(to) = RightSide(from);
+  // Sets rows `to` and `to` + 1 to what rows `from` and `from` + 1 say.
+  void CopyTwoRows(int from, int to) const {
+    std::copy_n(Row(from), 2 * kColumns, Row(to));
+    std::copy_n(right_side_.get() + from, 2, right_side_.get() + to);
   }
 
   // Sets one row per coefficient, from `first` on, that pulls it toward zero (ridge).
   void SetRidge(int first, float weight) const {
-    std::fill_n(Row(first), static_cast<ptrdiff_t>(columns_) * columns_, 0.0f);
-    for (int k = 0; k < columns_; ++k) {
-      Row(first + k)[k] = weight;
-      RightSide(first + k) = 0.0f;
-    }
+    float* rows = Row(first);
+    std::fill_n(rows, kColumns * kColumns, 0.0f);
+    std::fill_n(right_side_.get() + first, kColumns, 0.0f);
+    for (int k = 0; k < kColumns; ++k) rows[k * kColumns + k] = weight;
   }
 
   // A singular system leaves the solution as it was.
   void Solve(float* solution) const {
-    SolveLinearAxb(memory_, coefficients_.get(), rows_, columns_, solution, right_side_.get());
+    SolveLinearAxb(memory_, coefficients_.get(), rows_, kColumns, solution, right_side_.get());
   }
 
  private:
   MHandle memory_;
   int rows_;
-  int columns_;
   ScratchArray<float> coefficients_;
   ScratchArray<float> right_side_;
 };

@@ -39,7 +39,7 @@ namespace {
 
 constexpr CornerTextureTable UnrollTextureCoordinates() {
   CornerTextureTable table{};
-  for (std::size_t i = 0; i < N3DS_MASK_CORNER_COUNT; i++) {
+  for (size_t i = 0; i < N3DS_MASK_CORNER_COUNT; ++i) {
     const uint16_t vertex = kTriangles[i / 3][i % 3];
     table[2 * i] = kTextureCoordinates[vertex][0];
     table[2 * i + 1] = kTextureCoordinates[vertex][1];

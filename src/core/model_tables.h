@@ -43,7 +43,7 @@ extern const uint16_t kTriangles[N3DS_TRIANGLE_COUNT][3];
 extern const float kTextureCoordinates[kVertexCount][2];
 
 // The tables unrolled by triangle corner: u, v of vertex kTriangles[i / 3][i % 3].
-using CornerTextureTable = std::array<float, 2 * static_cast<std::size_t>(N3DS_MASK_CORNER_COUNT)>;
+using CornerTextureTable = std::array<float, 2 * static_cast<size_t>(N3DS_MASK_CORNER_COUNT)>;
 extern const CornerTextureTable kCornerTextureCoordinates;
 
 }  // namespace n3ds

@@ -16,11 +16,11 @@ namespace {
 // common factor of the camera-space point cancels in the perspective division.
 void NormalizePose(float* pose) {
   float n = 0.0f;
-  for (int i = 0; i < 4; i++) n = std::fma(pose[i], pose[i], n);
+  for (int i = 0; i < 4; ++i) n = std::fma(pose[i], pose[i], n);
   if (n == 0.0f) return;
-  for (int i = 4; i < kPoseSize; i++) pose[i] /= n;
+  for (int i = 4; i < kPoseSize; ++i) pose[i] /= n;
   const float length = std::sqrt(n);
-  for (int i = 0; i < 4; i++) pose[i] /= length;
+  for (int i = 0; i < 4; ++i) pose[i] /= length;
 }
 
 }  // namespace
@@ -41,7 +41,7 @@ int64_t FitRigidPose(MHandle memory, const int32_t* landmarks, const float* vert
   const int count = kFitLandmarkCount - first;
   float points_2d[2 * kFitLandmarkCount];
   float points_3d[3 * kFitLandmarkCount];
-  for (int i = 0; i < count; i++) {
+  for (int i = 0; i < count; ++i) {
     const float* vertex = vertices + 3 * static_cast<ptrdiff_t>(landmark_vertices[first + i]);
     std::memcpy(points_3d + 3 * i, vertex, 3 * sizeof(float));
     points_2d[2 * i] = static_cast<float>(landmarks[2 * (first + i)]);

@@ -47,12 +47,12 @@ inline LandmarkEquations LineariseProjection(const float* camera, const float* r
 
 // row[k] = direction . component k of the basis at the vertex, in mm, for several directions and
 // their rows at once, so that each model value is converted once.
-template <int kRows>
+template <size_t kRows>
 void ProjectBasis(const int16_t* basis, int count, int32_t vertex,
                   const Vector3* const (&directions)[kRows], float* const (&rows)[kRows]) {
   for (int k = 0; k < count; ++k) {
     const Vector3 component = VertexOf(basis + static_cast<ptrdiff_t>(k) * kShapeSize, vertex);
-    for (int r = 0; r < kRows; ++r) rows[r][k] = Dot(*directions[r], component) * kModelUnit;
+    for (size_t r = 0; r < kRows; ++r) rows[r][k] = Dot(*directions[r], component) * kModelUnit;
   }
 }
 

@@ -21,16 +21,17 @@ constexpr int kBrowEnds[] = {19, 24, 29, 34};
 constexpr int kFirstEyeLandmark = 39;
 constexpr int kExpressionLandmarkCount = 4 + kFitLandmarkCount - kFirstEyeLandmark;
 
-// Sets rows `row` and `row` + 1 to a landmark's two equations in `columns` coefficients.
-void SetLandmark(const RefitView& view, int landmark, const int16_t* basis, int columns, int row,
-                 const LinearSystem& system) {
+// Sets rows `row` and `row` + 1 to a landmark's two equations in the basis's coefficients.
+template <int kColumns>
+void SetLandmark(const RefitView& view, int landmark, const int16_t* basis, int row,
+                 const LinearSystem<kColumns>& system) {
   const int32_t vertex = view.landmark_vertices[landmark];
   const LandmarkEquations equations =
       LineariseProjection(view.camera, view.rotation, view.translation,
                           static_cast<float>(view.landmarks[2 * landmark]),
                           static_cast<float>(view.landmarks[2 * landmark + 1]));
-  ProjectBasis<2>(basis, columns, vertex, {&equations.x.direction, &equations.y.direction},
-                  {system.Row(row), system.Row(row + 1)});
+  ProjectBasis<2>(basis, kColumns, vertex, {&equations.x.direction, &equations.y.direction},
+                  {system.Row(row), system.Row(row) + kColumns});
   const Vector3 mean = VertexOf(view.mean_shape, vertex);
   system.RightSide(row) = RightHandSide(equations.x, mean);
   system.RightSide(row + 1) = RightHandSide(equations.y, mean);
@@ -40,10 +41,10 @@ void SetLandmark(const RefitView& view, int landmark, const int16_t* basis, int 
 void SolveIdentity(MHandle memory, const RefitView& view, const int16_t* identity_basis,
                    float* solution) {
   constexpr int kRidgeRow = 2 * kOutlineLandmarkCount;
-  const LinearSystem system(memory, kRidgeRow + kIdentityCount, kIdentityCount);
+  const LinearSystem<kIdentityCount> system(memory, kRidgeRow + kIdentityCount);
   if (!system) return;
   for (int i = 0; i < kOutlineLandmarkCount; ++i) {
-    SetLandmark(view, i, identity_basis, kIdentityCount, 2 * i, system);
+    SetLandmark(view, i, identity_basis, 2 * i, system);
   }
   system.SetRidge(kRidgeRow, kIdentityWeight * view.scale);
   system.Solve(solution);
@@ -68,14 +69,14 @@ void RefitExpressionRigid(MHandle memory, const RefitView& view, const int16_t* 
     return;
   }
   constexpr int kRidgeRow = 2 * kExpressionLandmarkCount;
-  const LinearSystem system(memory, kRidgeRow + kExpressionCount, kExpressionCount);
+  const LinearSystem<kExpressionCount> system(memory, kRidgeRow + kExpressionCount);
   if (!system) return;
 
   int row = 0;
   // The mean shape without the identity's part: the expression may take up what the identity leaves
   // unexplained.
   const auto set = [&](int landmark) {
-    SetLandmark(view, landmark, expression_basis, kExpressionCount, row, system);
+    SetLandmark(view, landmark, expression_basis, row, system);
     row += 2;
   };
   for (const int landmark : kBrowEnds) set(landmark);

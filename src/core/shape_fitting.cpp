@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "core/shape_fitting.h"
 
-#include <array>
-
 #include "core/linear_system.h"
 #include "core/model_tables.h"
 #include "core/projection_rows.h"
@@ -32,18 +30,20 @@ constexpr Substitution kSubstitutions[] = {
 };
 
 // Whether a landmark's own observation counts.
-constexpr std::array<bool, kFitLandmarkCount> kObserved = [] {
-  std::array<bool, kFitLandmarkCount> observed{};
-  for (bool& value : observed) value = true;
-  for (const Substitution& s : kSubstitutions) observed[s.landmark] = false;
-  return observed;
-}();
+struct ObservedLandmarks {
+  bool of[kFitLandmarkCount];
+  constexpr ObservedLandmarks() : of() {
+    for (bool& value : of) value = true;
+    for (const Substitution& s : kSubstitutions) of[s.landmark] = false;
+  }
+};
+constexpr ObservedLandmarks kObserved;
 
 // Substituted landmarks get the equations of their stand-ins.
-void Substitute(const LinearSystem& system) {
+template <int kColumns>
+void Substitute(const LinearSystem<kColumns>& system) {
   for (const Substitution& s : kSubstitutions) {
-    system.CopyRow(2 * s.stand_in, 2 * s.landmark);
-    system.CopyRow(2 * s.stand_in + 1, 2 * s.landmark + 1);
+    system.CopyTwoRows(2 * s.stand_in, 2 * s.landmark);
   }
 }
 
@@ -53,7 +53,7 @@ void Substitute(const LinearSystem& system) {
 // cache; each entry of A still takes its terms in increasing k.
 void AddInteraction(const int16_t* tensor, const float* identity_coef,
                     const int32_t* landmark_vertices, const LandmarkEquations* equations,
-                    const LinearSystem& system) {
+                    const LinearSystem<kExpressionCount>& system) {
   for (int k = 0; k < kIdentityCount; ++k) {
     const float coefficient = identity_coef[k];
     if (coefficient == 0.0f) continue;
@@ -61,13 +61,13 @@ void AddInteraction(const int16_t* tensor, const float* identity_coef,
       const int16_t* block =
           tensor + (static_cast<ptrdiff_t>(k) * kExpressionCount + j) * kShapeSize;
       for (int i = 0; i < kFitLandmarkCount; ++i) {
-        if (!kObserved[i]) continue;
+        if (!kObserved.of[i]) continue;
         const int16_t* stored = block + 3 * static_cast<ptrdiff_t>(landmark_vertices[i]);
         if ((stored[0] | stored[1] | stored[2]) == 0) continue;  // most of the tensor is zero
         const Vector3 interaction = VertexOf(block, landmark_vertices[i]);
-        system.Row(2 * i)[j] +=
-            coefficient * (Dot(equations[i].x.direction, interaction) * kModelUnit);
-        system.Row(2 * i + 1)[j] +=
+        float* entry = system.Row(2 * i) + j;
+        entry[0] += coefficient * (Dot(equations[i].x.direction, interaction) * kModelUnit);
+        entry[kExpressionCount] +=
             coefficient * (Dot(equations[i].y.direction, interaction) * kModelUnit);
       }
     }
@@ -85,7 +85,7 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
       identity_coef == nullptr || landmark_vertices == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  const LinearSystem system(memory, kIdentityRows, kIdentityCount);
+  const LinearSystem<kIdentityCount> system(memory, kIdentityRows);
   if (!system) return N3DS_NO_MEMORY;
 
   const Vector3 depth = RowOf(rotation, 2);
@@ -98,7 +98,7 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
     const Vector3 mean = VertexOf(mean_shape, vertex);
     float* row_x = system.Row(2 * i);
     float* row_y = system.Row(2 * i + 1);
-    if (kObserved[i]) {
+    if (kObserved.of[i]) {
       system.RightSide(2 * i) = RightHandSide(equations.x, mean);
       system.RightSide(2 * i + 1) = RightHandSide(equations.y, mean);
     }
@@ -112,7 +112,7 @@ int32_t SolveForIdentityCoef(MHandle memory, const float* points, const int16_t*
     // the fit would explain the image by noses of any length.
     const int depth_index = kLandmarkRows + i - kOutlineLandmarkCount;
     float* depth_row = system.Row(depth_index);
-    if (kObserved[i]) {
+    if (kObserved.of[i]) {
       ProjectBasis<3>(identity_basis, kIdentityCount, vertex,
                       {&equations.x.direction, &equations.y.direction, &depth},
                       {row_x, row_y, depth_row});
@@ -140,19 +140,20 @@ int32_t SolveForExpressionCoef(MHandle memory, const int32_t* landmarks, const i
       expression_coef == nullptr || landmark_vertices == nullptr) {
     return N3DS_NULL_ARGUMENT;
   }
-  const LinearSystem system(memory, kExpressionRows, kExpressionCount);
+  const LinearSystem<kExpressionCount> system(memory, kExpressionRows);
   if (!system) return N3DS_NO_MEMORY;
 
   LandmarkEquations equations[kFitLandmarkCount];
   for (int i = 0; i < kFitLandmarkCount; ++i) {
-    if (!kObserved[i]) continue;
+    if (!kObserved.of[i]) continue;
     const int32_t vertex = landmark_vertices[i];
     equations[i] =
         LineariseProjection(camera, rotation, translation, static_cast<float>(landmarks[2 * i]),
                             static_cast<float>(landmarks[2 * i + 1]));
     const ProjectionEquation &x = equations[i].x, &y = equations[i].y;
+    float* row_x = system.Row(2 * i);
     ProjectBasis<2>(expression_basis, kExpressionCount, vertex, {&x.direction, &y.direction},
-                    {system.Row(2 * i), system.Row(2 * i + 1)});
+                    {row_x, row_x + kExpressionCount});
 
     float along_x[kIdentityCount], along_y[kIdentityCount];
     ProjectBasis<2>(identity_basis, kIdentityCount, vertex, {&x.direction, &y.direction},
