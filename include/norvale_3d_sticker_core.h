@@ -39,15 +39,16 @@ extern "C" {
  * must serialise its use.
  *
  * A tracking context allocates on its worker threads, one per face, so only a context that tracks a
- * single face may live in a pool. For one face (either mode, 165 landmarks) 4,080,000 bytes were
- * enough in trials; give it 4,500,000, plus 4 * width * height for each mask image that
- * N3DS_WarpFaceMask sets up in it. What too small a pool does depends on its size:
+ * single face may live in a pool. It takes about 4.08 MB (either mode, 165 landmarks): make the
+ * pool 4,500,000 bytes, plus 4 * width * height for each mask image that N3DS_WarpFaceMask sets up
+ * in it. With a single configured processor, whose only worker fits one face after the other, that
+ * serves five faces too (4.16 MB). What too small a pool does depends on its size:
  *
  *   below 0.12 MB    N3DS_Init aborts the process
  *   below 4.00 MB    N3DS_LoadFaceHouse returns N3DS_NO_MEMORY
  *   below 4.04 MB    frame calls return N3DS_NO_MEMORY or N3DS_NUMERICAL
  *   4.03 to 4.06 MB  rigid frames never return: the fit is repeated without a limit
- *   below 4.08 MB    frame calls return N3DS_OK, but leave out steps of the fit */
+ *   below 4.10 MB    frame calls may return N3DS_OK, but leave out steps of the fit */
 typedef void* MHandle;
 
 /* Makes a pool in an area of the caller's, which must outlive it.
