@@ -75,7 +75,8 @@ def draw(points: np.ndarray, triangles: np.ndarray, size: int = 600, span: float
             colour = np.where((edge < 0.55 * sampling)[:, None], [40.0, 60.0, 110.0], colour)
         picture[window][hit] = colour
     small = picture.reshape(size, sampling, size, sampling, 3).mean(axis=(1, 3))
-    return np.clip(small + 0.5, 0, 255).astype(np.uint8)
+    # Rounded first, so that no pixel hangs on the last bits of a product.
+    return np.clip(np.round(small, 6) + 0.5, 0, 255).astype(np.uint8)
 
 
 def row(pictures: list[np.ndarray]) -> np.ndarray:
