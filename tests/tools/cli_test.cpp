@@ -392,6 +392,24 @@ TEST_F(Cli, EvalPrintsARowATrackAndOneOverAll) {
   EXPECT_THAT(folder_.Names(), ElementsAre("scores.csv"));
 }
 
+TEST_F(Cli, EvalExplainsItsColumnsAndShowsAllWhereAsked) {
+  const std::string track = ExampleTrack("synthetic_three");
+  const auto head = [](const Outcome& outcome) {
+    return outcome.out.substr(0, outcome.out.find('\n'));
+  };
+  const Outcome main = Run({"eval", track});
+  EXPECT_THAT(main.out, AllOf(HasSubstr("\nlost       no pose"), Not(HasSubstr("\nfolded "))));
+  EXPECT_EQ(head(main).find("rot20"), std::string::npos);
+  const Outcome mask = Run({"eval", track, "--mode", "mask"});
+  EXPECT_THAT(mask.out, HasSubstr("\nfolded     faces with"));
+  EXPECT_LE(head(main).size(), 100u);
+  EXPECT_LE(head(mask).size(), 130u);
+  for (const Outcome& outcome : {main, mask}) {
+    EXPECT_THAT(head(outcome), AllOf(HasSubstr("rot40"), HasSubstr("across"), HasSubstr("lag")));
+  }
+  EXPECT_THAT(head(Run({"eval", track, "--wide"})), AllOf(HasSubstr("rot20"), HasSubstr("rot60")));
+}
+
 TEST_F(Cli, EvalAddsColumnsForMeshes) {
   const std::string csv = folder_.Path("scores.csv");
   const Outcome outcome = Run({"eval", ExampleTrack("synthetic_talk_165"),

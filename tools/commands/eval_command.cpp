@@ -15,10 +15,10 @@
 #include "commands/options.h"
 #include "commands/outputs.h"
 #include "engine/engine_session.h"
-#include "engine/face_model_file.h"
 #include "eval/mesh_metrics.h"
 #include "eval/metrics.h"
 #include "eval/score_table.h"
+#include "model/face_model_file.h"
 #include "support/atomic_file.h"
 #include "support/progress.h"
 #include "tracks/track_file.h"
@@ -30,6 +30,7 @@ struct EvalOptions {
   EngineOptions engine;
   std::vector<std::string> tracks;
   std::string csv;
+  bool wide = false;
 };
 
 void RunEvalCommand(const EvalOptions& options) {
@@ -81,10 +82,15 @@ void RunEvalCommand(const EvalOptions& options) {
     table.PrintCsv(out.stream());
     out.Commit();
   }
-  table.Print(std::cout);
+  if (options.wide) {
+    table.Print(std::cout);
+  } else {
+    table.Print(std::cout, MainColumns(!meshes.empty()));
+  }
   const Vector3 turn = RotationVector(offset.rotation);
   std::printf("head frame: turned by %.2f %.2f %.2f degrees, origin at %.1f %.1f %.1f mm\n",
               turn[0], turn[1], turn[2], offset.origin[0], offset.origin[1], offset.origin[2]);
+  std::printf("\n%s%s", kScoreTableLegend, meshes.empty() ? "" : kMeshColumnsLegend);
 }
 
 }  // namespace
@@ -98,16 +104,17 @@ void AddEvalCommand(CLI::App& app) {
       ->required()
       ->type_name("");
   AddFileOption(*command, "--csv", options->csv, "The table as CSV, with all columns");
+  command->add_flag("--wide", options->wide, "Print all columns instead of the main ones");
   AddEngineOptions(*command, options->engine);
-  command->footer(
-      std::string("Columns:\n") + kScoreTableLegend + "With --mode mask also:\n" +
-      kMeshColumnsLegend +
-      "\nThe last line gives the constant offset between the truth's head frame and the\n"
-      "engine's that was taken off, estimated over all tracks together.\n"
-      "Examples:\n"
-      "  n3ds eval examples/tracks/synthetic_yaw_sweep.track.jsonl\n"
-      "  n3ds eval *.track.jsonl --csv scores.csv\n"
-      "  n3ds eval examples/tracks/synthetic_talk_165.track.jsonl --mode mask");
+  command->footer(std::string("Columns (rot20, rot60 and more percentiles with --wide):\n") +
+                  kScoreTableLegend + "With --mode mask also:\n" + kMeshColumnsLegend +
+                  "\nThe line below the table gives the constant offset between the truth's head "
+                  "frame and the\n"
+                  "engine's that was taken off, estimated over all tracks together.\n"
+                  "Examples:\n"
+                  "  n3ds eval examples/tracks/synthetic_yaw_sweep.track.jsonl\n"
+                  "  n3ds eval *.track.jsonl --csv scores.csv\n"
+                  "  n3ds eval examples/tracks/synthetic_talk_165.track.jsonl --mode mask");
   command->callback([options] { RunEvalCommand(*options); });
 }
 

@@ -66,8 +66,8 @@ const char kScoreTableLegend[] =
     "swaps      pose lies nearer to another person's place than to its own\n"
     "jumps      error changes from one frame to the next by more than 8 degrees, 25 mm across or\n"
     "           15 % of the depth\n"
-    "rot20..    rotation error in degrees, median and 95th percentile, of the heads turned by at\n"
-    "           most 20, 40 and 60 degrees, after one constant offset between the head frames\n"
+    "rotN, p95  rotation error in degrees, median and 95th percentile, of the heads turned by at\n"
+    "           most N degrees, after one constant offset between the head frames\n"
     "across     offset of the head's origin parallel to the picture, mm\n"
     "depth      error of the distance in percent, for the true focal length\n"
     "jit        root mean square of the error's change between frames, in degrees and mm, while\n"
@@ -76,7 +76,7 @@ const char kScoreTableLegend[] =
 
 const char kMeshColumnsLegend[] =
     "mesh       distance of the inner landmarks to their vertices of the dense mesh in the\n"
-    "           picture, percent of the distance between the pupils, median and 95th percentile\n"
+    "           picture, percent of the interpupillary distance, median and 95th percentile\n"
     "           over the heads turned by at most 40 degrees\n"
     "true       the same from where the landmarks truly are, in the frames that tell it\n"
     "broken     faces with a mesh that is not finite\n"
@@ -84,6 +84,14 @@ const char kMeshColumnsLegend[] =
     "or\n"
     "           the mean face\n"
     "mouth      how far the mesh's mouth opens where the landmarks' opens by one\n";
+
+std::vector<std::size_t> MainColumns(bool with_meshes) {
+  // track, faces, lost, swaps, jumps; rot40, p95; medians of across and depth; jit deg, jit mm, lag
+  std::vector<std::size_t> columns = {0, 1, 2, 3, 4, 7, 8, 11, 13, 15, 16, 17};
+  // mesh, p95, broken, folded, mouth
+  if (with_meshes) columns.insert(columns.end(), {18, 19, 22, 23, 24});
+  return columns;
+}
 
 TextTable ScoreTable(const NamedScores& scores, const std::vector<MeshScore>& meshes) {
   std::vector<std::string> head = {"track", "faces", "lost", "swaps",   "jumps",  "rot20",

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdio>
+#include <numeric>
 #include <utility>
 
 namespace n3ds::tool {
@@ -13,14 +14,21 @@ TextTable::TextTable(std::vector<std::string> head) { rows_.push_back(std::move(
 void TextTable::AddRow(std::vector<std::string> row) { rows_.push_back(std::move(row)); }
 
 void TextTable::Print(std::ostream& out) const {
+  std::vector<std::size_t> all(rows_.front().size());
+  std::iota(all.begin(), all.end(), std::size_t{0});
+  Print(out, all);
+}
+
+void TextTable::Print(std::ostream& out, const std::vector<std::size_t>& columns) const {
   std::vector<std::size_t> widths(rows_.front().size(), 0);
   for (const auto& row : rows_) {
-    for (std::size_t c = 0; c < row.size(); ++c) widths[c] = std::max(widths[c], row[c].size());
+    for (const std::size_t c : columns) widths[c] = std::max(widths[c], row[c].size());
   }
   for (const auto& row : rows_) {
-    std::string line = row[0] + std::string(widths[0] - row[0].size(), ' ');
-    for (std::size_t c = 1; c < row.size(); ++c) {
-      line += std::string(widths[c] - row[c].size() + 2, ' ') + row[c];
+    std::string line;
+    for (const std::size_t c : columns) {
+      const std::string blanks(widths[c] - row[c].size(), ' ');
+      line += c == 0 ? row[c] + blanks : "  " + blanks + row[c];
     }
     out << line << '\n';
   }

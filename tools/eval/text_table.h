@@ -2,6 +2,7 @@
 // A table for the terminal (columns lined up) or as CSV.
 #pragma once
 
+#include <cstddef>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -15,6 +16,8 @@ class TextTable {
   // `row` has as many cells as the head.
   void AddRow(std::vector<std::string> row);
   void Print(std::ostream& out) const;
+  // The same with the given columns alone, by their number.
+  void Print(std::ostream& out, const std::vector<std::size_t>& columns) const;
   void PrintCsv(std::ostream& out) const;
 
  private:
