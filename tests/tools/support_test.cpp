@@ -11,8 +11,9 @@
 #include <limits>
 #include <sstream>
 
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 #include "engine/results_file.h"
+#include "core/output_matrices.h"
 #include "eval/text_table.h"
 #include "scratch_folder.h"
 #include "support/atomic_file.h"
@@ -216,6 +217,14 @@ TEST(TextTable, LinesUpNumbers) {
   EXPECT_EQ(out.str(), "track          n\na            100\nlonger name    5\n");
 }
 
+TEST(TextTable, PrintsTheColumnsAskedFor) {
+  TextTable table({"track", "a", "b", "long name"});
+  table.AddRow({"x", "1", "22", "3"});
+  std::ostringstream out;
+  table.Print(out, {0, 2});
+  EXPECT_EQ(out.str(), "track   b\nx      22\n");
+}
+
 TEST(TextTable, QuotesCsvCells) {
   TextTable table({"track", "n"});
   table.AddRow({"a,\"b\"", "1"});
@@ -243,7 +252,7 @@ TEST(ResultsFile, FloatsReadBackToTheSameBits) {
   }
 }
 
-TEST(ResultsFile, WhatIsNoNumberIsNull) {
+TEST(ResultsFile, WritesNonFiniteValuesAsNull) {
   FrameResult frame;
   frame.faces.emplace_back();
   frame.faces[0].landmarks3d = {1, std::numeric_limits<float>::quiet_NaN(),
@@ -252,6 +261,10 @@ TEST(ResultsFile, WhatIsNoNumberIsNull) {
   WriteResultsFrame(out, frame);
   EXPECT_THAT(out.str(), HasSubstr("\"landmarks3d\":[1,null,null]"));
 }
+
+// The engine's own, which the public headers do not show.
+static_assert(static_cast<float>(kTiltCosine) == n3ds::kTiltCosine);
+static_assert(static_cast<float>(kTiltSine) == n3ds::kTiltSine);
 
 TEST(FaceModelFile, ShipsAnUprightFaceOfHumanSize) {
   const FaceModelFile model = ReadFaceModelFile(N3DS_SOURCE_DIR "/data/face_model.bin");

@@ -14,7 +14,7 @@
 #include "commands/commands.h"
 #include "commands/model_commands.h"
 #include "commands/options.h"
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 #include "support/error.h"
 
 namespace n3ds::tool {

@@ -10,9 +10,9 @@
 #include <numeric>
 #include <utility>
 
-#include "engine/face_model_file.h"
 #include "engine/face_results.h"
 #include "mesh/face_tables.h"
+#include "model/face_model_file.h"
 #include "support/error.h"
 #include "tracks/upright.h"
 

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <cmath>
 
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 
 namespace n3ds::tool {
 namespace {

@@ -4,8 +4,8 @@
 #include <array>
 #include <cstddef>
 
-#include "engine/face_model_file.h"
 #include "mesh/obj_writer.h"
+#include "model/face_model_file.h"
 
 namespace n3ds::tool {
 namespace {

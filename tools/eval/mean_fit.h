@@ -5,8 +5,8 @@
 
 #include <vector>
 
-#include "engine/face_model_file.h"
 #include "engine/face_results.h"
+#include "model/face_model_file.h"
 
 namespace n3ds::tool {
 

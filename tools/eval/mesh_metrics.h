@@ -6,9 +6,9 @@
 #include <cstddef>
 #include <vector>
 
-#include "engine/face_model_file.h"
 #include "engine/face_results.h"
 #include "eval/metrics.h"
+#include "model/face_model_file.h"
 #include "tracks/track_file.h"
 
 namespace n3ds::tool {

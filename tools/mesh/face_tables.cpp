@@ -3,7 +3,7 @@
 
 #include <algorithm>
 
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 #include "support/error.h"
 
 namespace n3ds::tool {

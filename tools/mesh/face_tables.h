@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "norvale_3d_sticker_engine.h"
 #include "support/vector3.h"
 
 namespace n3ds::tool {
@@ -15,8 +16,9 @@ namespace n3ds::tool {
 using Triangle = std::array<std::size_t, 3>;  // counter-clockwise seen from outside
 using Place = std::array<double, 2>;          // u, v; v downwards
 
-constexpr std::size_t kMeshTriangles = 3456;
-constexpr std::size_t kMeshCorners = 3 * kMeshTriangles;
+constexpr std::size_t kMeshTriangles = N3DS_TRIANGLE_COUNT;
+constexpr std::size_t kMeshCorners = N3DS_MASK_CORNER_COUNT;
+static_assert(kMeshCorners == 3 * kMeshTriangles);
 
 // Landmarks with a vertex of their own that does not change with the view: brows, eyes, nose, lips.
 constexpr std::size_t kFirstInnerLandmark = 19;

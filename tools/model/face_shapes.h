@@ -6,7 +6,7 @@
 #include <cstddef>
 #include <vector>
 
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 
 namespace n3ds::tool {
 

@@ -2,8 +2,8 @@
 // The geometric checks of a face model, a section each.
 #pragma once
 
-#include "engine/face_model_file.h"
 #include "model/check_report.h"
+#include "model/face_model_file.h"
 
 namespace n3ds::tool {
 

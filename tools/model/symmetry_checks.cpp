@@ -13,7 +13,7 @@ namespace n3ds::tool {
 namespace {
 
 constexpr double kMiddle = 0.499946;  // u of the line about which the texture is symmetric
-constexpr double kNear = 2e-6;        // the texture is given with six decimals
+constexpr double kNear = 2e-6;        // the table has six decimals
 
 using Mirror = std::vector<std::size_t>;  // the mirrored vertex of each vertex
 

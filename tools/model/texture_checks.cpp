@@ -17,7 +17,7 @@
 namespace n3ds::tool {
 namespace {
 
-constexpr double kSame = 5e-7;  // the texture is given with six decimals
+constexpr double kSame = 5e-7;  // the table has six decimals
 constexpr std::array<Place, 3> kFirstPlaces = {
     {{0.069524, 0.281949}, {0.081158, 0.319456}, {0.038178, 0.318155}}};
 constexpr Place kLow = {0.016646, 0.002930};
@@ -120,7 +120,7 @@ void CheckTexture(const FaceModelFile& model, CheckReport& report) {
   report.Section("Texture");
   const std::vector<Place>& uv = FaceTexture();
   report.Equal("distinct places", std::set<Place>(uv.begin(), uv.end()).size(), kModelVertices);
-  report.Check("first three places as given", "",
+  report.Check("first three places, part of the file format", "",
                std::equal(kFirstPlaces.begin(), kFirstPlaces.end(), uv.begin(), Same));
   Place low = uv[0];
   Place high = uv[0];

@@ -4,7 +4,7 @@
 
 #include <vector>
 
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 #include "render/mesh.h"
 
 namespace n3ds::tool {

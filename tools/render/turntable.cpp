@@ -8,6 +8,7 @@
 #include "render/gl_program.h"
 #include "render/gpu_mesh.h"
 #include "render/render_target.h"
+#include "render/shaders.h"
 #include "render/shapes.h"
 
 namespace n3ds::tool {
@@ -18,39 +19,6 @@ constexpr float kDistance = 900;                       // mm from the camera to 
 constexpr float kSpan = 250;                           // mm of the head that a view shows there
 constexpr std::array<float, 3> kMiddle = {0, -8, 50};  // about which the head turns
 constexpr float kDepth = 200;                          // mm, no face is deeper
-
-const char kVertexSource[] = R"(
-layout(location = 0) in vec3 position;
-layout(location = 1) in vec3 normal;
-uniform mat4 projection;
-uniform mat4 model;
-out vec3 eye_position;
-out vec3 eye_normal;
-void main() {
-  vec4 eye = model * vec4(position, 1.0);
-  eye_position = eye.xyz;
-  eye_normal = mat3(model) * normal;
-  gl_Position = projection * eye;
-})";
-
-// As in a portrait studio: a strong light from the upper left, a weak one from the right, so that
-// the form shows on both halves. The inside, seen through eyes and mouth, is dark.
-const char kFragmentSource[] = R"(
-in vec3 eye_position;
-in vec3 eye_normal;
-uniform vec3 colour;
-out vec4 result;
-void main() {
-  vec3 n = normalize(eye_normal);
-  vec3 to_viewer = normalize(-eye_position);
-  vec3 to_light = normalize(vec3(-0.55, 0.60, 0.75));
-  float direct = max(dot(n, to_light), 0.0);
-  float fill = max(dot(n, normalize(vec3(0.80, 0.10, 0.50))), 0.0);
-  float sky = 0.5 + 0.5 * n.y;
-  float highlight = 0.10 * pow(max(dot(n, normalize(to_light + to_viewer)), 0.0), 22.0);
-  vec3 lit = colour * (0.14 + 0.12 * sky + 0.66 * direct + 0.18 * fill) + vec3(highlight);
-  result = vec4(gl_FrontFacing ? lit : 0.25 * colour, 1.0);
-})";
 
 using Matrix = std::array<float, 16>;  // column by column
 
@@ -101,7 +69,7 @@ double YawOf(int view, int views) {
 Picture DrawTurntable(const Points& face, int views, int size) {
   const EglContext context;
   const RenderTarget target(size, size);
-  const GlProgram program(kVertexSource, kFragmentSource);
+  const GlProgram program(kSolidVertex, kStudioFragment);
   const GpuMesh mesh(FaceMesh(face));
   Picture row(views * size, size);
   target.Bind();
@@ -109,6 +77,8 @@ Picture DrawTurntable(const Points& face, int views, int size) {
   glEnable(GL_DEPTH_TEST);
   program.Use();
   glUniformMatrix4fv(program.Uniform("projection"), 1, GL_FALSE, Projection().data());
+  constexpr Matrix kIdentity = {1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1, 0, 0, 0, 0, 1};
+  glUniformMatrix4fv(program.Uniform("view"), 1, GL_FALSE, kIdentity.data());
   for (int view = 0; view < views; ++view) {
     target.Bind();
     glClearColor(0.16F, 0.17F, 0.19F, 1);

@@ -156,7 +156,7 @@ TrackHeader ParseHeader(const Place& place, const json& object) {
   header.fps = Number(place, Field(place, object, "fps"), "\"fps\"");
   if (header.fps <= 0) place.Fail("\"fps\" is not positive");
   header.landmarks = whole("landmarks", 0, 100000);
-  if (header.landmarks != 101 && header.landmarks != 165) {
+  if (header.landmarks != N3DS_LANDMARKS_101 && header.landmarks != N3DS_LANDMARKS_165) {
     place.Fail("\"landmarks\" is " + std::to_string(header.landmarks) + ", expected 101 or 165");
   }
   header.degree = whole("degree", -100000, 100000);

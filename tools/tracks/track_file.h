@@ -22,11 +22,12 @@
 #include <string>
 #include <vector>
 
+#include "norvale_3d_sticker_engine.h"
 #include "support/error.h"
 
 namespace n3ds::tool {
 
-constexpr std::size_t kMaxTrackFaces = 5;       // what the engine accepts in one frame
+constexpr std::size_t kMaxTrackFaces = N3DS_MAX_FACES;
 constexpr int kMaxTrackImageSize = 16384;       // pixels a side; beyond it a header is damaged
 constexpr std::size_t kMaxTrackLine = 1 << 20;  // bytes; the longest real line has about 60,000
 constexpr std::size_t kMaxTrackNesting = 64;    // arrays and objects; a frame has 5 levels
@@ -52,7 +53,7 @@ struct TrackHeader {
   int width = 0;  // of the picture as delivered
   int height = 0;
   double fps = 0;
-  int landmarks = 0;  // 101 or 165
+  int landmarks = 0;  // N3DS_LANDMARKS_101 or N3DS_LANDMARKS_165
   int degree = 0;     // 0, 90, 180 or 270, clockwise turn of the delivered picture
   int mirror = 0;     // 1 for a mirrored picture
   std::string source;

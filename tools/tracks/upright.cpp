@@ -14,30 +14,26 @@ struct MirrorRun {
   int sum;
 };
 
+// clang-format off
 constexpr MirrorRun kMirrorRuns[] = {
-    {0, 18, 18},                   // outline
-    {19, 24, 53},  {25, 28, 63},   // brows: upper edge, lower edge
-    {39, 45, 96},  {46, 50, 108},  // eyes: upper lid, lower lid
-    {63, 74, 137},                 // nose
-    {75, 81, 156}, {82, 86, 168},  // outer lip: upper edge, lower edge
-    {87, 91, 178}, {92, 94, 186},  // inner lip
-    {95, 96, 191},                 // pupils
+    {0, 18, 18},                         // outline
+    {19, 24, 53},    {25, 28, 63},       // brows: upper edge, lower edge
+    {39, 45, 96},    {46, 50, 108},      // eyes: upper lid, lower lid
+    {63, 74, 137},                       // nose
+    {75, 81, 156},   {82, 86, 168},      // outer lip: upper edge, lower edge
+    {87, 91, 178},   {92, 94, 186},      // inner lip
+    {95, 96, 191},                       // pupils
+    // The layout of 165 alone:
+    {101, 102, 203},                     // pupils again
+    {103, 120, 223},                     // between outline landmarks
+    {121, 126, 259}, {127, 132, 271},    // between eye landmarks
+    {145, 150, 295}, {151, 156, 307},    // between outer lip landmarks
+    {157, 160, 317}, {161, 164, 325},    // between inner lip landmarks
 };
+// clang-format on
 
-constexpr MirrorRun kMirrorRuns165[] = {
-    {101, 102, 203},                   // pupils again
-    {103, 120, 223},                   // between outline landmarks
-    {121, 126, 259}, {127, 132, 271},  // between eye landmarks
-    {145, 150, 295}, {151, 156, 307},  // between outer lip landmarks
-    {157, 160, 317}, {161, 164, 325},  // between inner lip landmarks
-};
-
-bool Apply(const MirrorRun& run, int& landmark) {
-  const int partner = run.sum - landmark;
-  const bool in_run = (landmark >= run.first && landmark <= run.last) ||
-                      (partner >= run.first && partner <= run.last);
-  if (in_run) landmark = partner;
-  return in_run;
+bool Contains(const MirrorRun& run, int landmark) {
+  return landmark >= run.first && landmark <= run.last;
 }
 
 }  // namespace
@@ -60,12 +56,9 @@ PixelPoint ToUpright(const TrackHeader& header, double x, double y) {
 
 int MirrorLandmark(int landmark, int landmarks) {
   for (const MirrorRun& run : kMirrorRuns) {
-    if (Apply(run, landmark)) return landmark;
-  }
-  if (landmarks == 165) {
-    for (const MirrorRun& run : kMirrorRuns165) {
-      if (Apply(run, landmark)) return landmark;
-    }
+    if (run.first >= landmarks) break;
+    const int partner = run.sum - landmark;
+    if (Contains(run, landmark) || Contains(run, partner)) return partner;
   }
   return landmark;
 }

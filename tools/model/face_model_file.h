@@ -8,14 +8,20 @@
 #include <string>
 #include <vector>
 
+#include "norvale_3d_sticker_engine.h"
 #include "support/vector3.h"
 
 namespace n3ds::tool {
 
-constexpr std::size_t kModelVertices = 1812;
+constexpr std::size_t kModelVertices = N3DS_VERTEX_COUNT;
 constexpr std::size_t kModelIdentities = 16;
 constexpr std::size_t kModelExpressions = 20;
 constexpr std::size_t kModelCoordinates = 3 * kModelVertices;
+
+// The header's three numbers, then the arrays below.
+static_assert(12 + 2 * (1 + kModelIdentities + kModelExpressions) * kModelCoordinates +
+                  kModelIdentities * kModelExpressions * kModelCoordinates ==
+              N3DS_FACE_MODEL_BYTES);
 
 struct FaceModelFile {
   std::vector<std::int16_t> mean;        // x, y, z per vertex in 1/256 mm, pitched

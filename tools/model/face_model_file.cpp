@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: MIT
-#include "engine/face_model_file.h"
+#include "model/face_model_file.h"
 
 #include <fstream>
 
-#include "norvale_3d_sticker_engine.h"
 #include "support/error.h"
 
 namespace n3ds::tool {
