@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <map>
 
-#include "render/picture.h"
+#include "render/image.h"
 #include "tool_test.h"
 
 namespace n3ds::tool {
@@ -21,42 +21,42 @@ using ::testing::SizeIs;
 
 using Rgb = std::array<int, 3>;
 
-Rgb At(const Picture& picture, int x, int y) {
-  const std::uint8_t* p = picture.Pixel(x, y);
+Rgb At(const Image& image, int x, int y) {
+  const std::uint8_t* p = image.Pixel(x, y);
   return {p[0], p[1], p[2]};
 }
 
-Picture Plain(int width, int height, std::uint8_t grey) {
-  Picture picture(width, height);
-  for (std::size_t i = 0; i < picture.rgba.size(); ++i) {
-    if (i % 4 != 3) picture.rgba[i] = grey;
+Image Plain(int width, int height, std::uint8_t grey) {
+  Image image(width, height);
+  for (std::size_t i = 0; i < image.rgba.size(); ++i) {
+    if (i % 4 != 3) image.rgba[i] = grey;
   }
-  return picture;
+  return image;
 }
 
 // Red left, green right, the lower half darker.
-Picture FourColours() {
-  Picture picture(128, 128);
+Image FourColours() {
+  Image image(128, 128);
   for (int y = 0; y < 128; ++y) {
     for (int x = 0; x < 128; ++x) {
       const auto level = static_cast<std::uint8_t>(y < 64 ? 240 : 120);
-      std::uint8_t* p = picture.Pixel(x, y);
+      std::uint8_t* p = image.Pixel(x, y);
       p[0] = x < 64 ? level : 0;
       p[1] = x < 64 ? 0 : level;
       p[2] = 0;
     }
   }
-  return picture;
+  return image;
 }
 
 class CliMask : public ToolTest {
  protected:
-  std::string Save(const std::string& name, const Picture& picture) {
-    WritePng(console_.Path(name), picture);
+  std::string Save(const std::string& name, const Image& image) {
+    WritePng(console_.Path(name), image);
     return console_.Path(name);
   }
 
-  // A copy of an example track with another picture size.
+  // A copy of an example track with another image size.
   std::string Resized(const std::string& track, int width, int height) {
     std::string text = ReadFile(ExampleTrack(track));
     const auto replace = [&](const std::string& key, int value) {
@@ -68,9 +68,9 @@ class CliMask : public ToolTest {
     return console_.Write("resized.track.jsonl", text);
   }
 
-  // The picture with the mask, which must come out.
-  Picture Masked(const std::string& photo, const std::string& track, const std::string& texture,
-                 const std::vector<std::string>& more = {}) {
+  // The image with the mask, which must come out.
+  Image Masked(const std::string& photo, const std::string& track, const std::string& texture,
+               const std::vector<std::string>& more = {}) {
     std::vector<std::string> arguments = {
         "mask", photo, track, "--texture", texture, "--out", folder_.Path("a.png")};
     arguments.insert(arguments.end(), more.begin(), more.end());
@@ -78,7 +78,7 @@ class CliMask : public ToolTest {
     EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
     EXPECT_THAT(outcome.err, IsEmpty());
     EXPECT_THAT(folder_.Names(), ElementsAre("a.png"));
-    return outcome.exit_code == 0 ? ReadPicture(folder_.Path("a.png")) : Picture();
+    return outcome.exit_code == 0 ? ReadImage(folder_.Path("a.png")) : Image();
   }
 
   const std::string astronaut_ = ExampleTrack("photo_astronaut");
@@ -90,7 +90,7 @@ TEST_F(CliMask, PutsTheMaskOnTheFaceInBothFormats) {
   const std::string photo = Save("photo.png", Plain(512, 512, 128));
   const std::string texture = Save("texture.png", FourColours());
   for (const char* format : {"bgr24", "nv21"}) {
-    const Picture masked = Masked(photo, astronaut_, texture, {"--format", format});
+    const Image masked = Masked(photo, astronaut_, texture, {"--format", format});
     ASSERT_EQ(masked.width, 512);
     ASSERT_EQ(masked.height, 512);
     // Level 128 leaves three quarters of the mask's colour; even an opaque one lets 1/256 through.
@@ -111,18 +111,18 @@ TEST_F(CliMask, PutsTheMaskOnTheFaceInBothFormats) {
 }
 
 TEST_F(CliMask, TransparentMasksChangeNothing) {
-  Picture clear = FourColours();
+  Image clear = FourColours();
   for (std::size_t i = 3; i < clear.rgba.size(); i += 4) clear.rgba[i] = 0;
   const std::string texture = Save("clear.png", clear);
-  const Picture photo = Plain(512, 512, 77);
+  const Image photo = Plain(512, 512, 77);
   EXPECT_EQ(Masked(Save("photo.png", photo), astronaut_, texture).rgba, photo.rgba);
 }
 
-// The photo is delivered lying and mirrored; the picture that comes out is upright.
+// The photo is delivered lying and mirrored; the image that comes out is upright.
 TEST_F(CliMask, TurnsThePhotoUpright) {
   const std::string photo = Save("photo.png", Plain(270, 480, 128));
-  const Picture masked = Masked(photo, ExampleTrack("real_man_270_mirror"),
-                                Save("texture.png", FourColours()), {"--frame", "5"});
+  const Image masked = Masked(photo, ExampleTrack("real_man_270_mirror"),
+                              Save("texture.png", FourColours()), {"--frame", "5"});
   ASSERT_EQ(masked.width, 480);
   ASSERT_EQ(masked.height, 270);
   double red_x = 0;
@@ -172,13 +172,13 @@ TEST_F(CliMask, EveryFaceGetsItsMask) {
   EXPECT_THAT(outcome.out, HasSubstr("a.png: 5 faces"));
 }
 
-// Blocks of 2 x 2 pixels leave no row or column of an odd picture out.
-TEST_F(CliMask, OddPicturesStayOdd) {
+// Blocks of 2 x 2 pixels leave no row or column of an odd image out.
+TEST_F(CliMask, OddImagesStayOdd) {
   const std::string track = Resized("photo_astronaut", 241, 161);
-  Picture photo = Plain(241, 161, 50);
+  Image photo = Plain(241, 161, 50);
   const std::string texture = Save("texture.png", FourColours());
   for (const char* format : {"bgr24", "nv21"}) {
-    const Picture masked = Masked(Save("photo.png", photo), track, texture, {"--format", format});
+    const Image masked = Masked(Save("photo.png", photo), track, texture, {"--format", format});
     ASSERT_EQ(masked.width, 241);
     ASSERT_EQ(masked.height, 161);
     // The face reaches beyond the right and the lower border.
@@ -188,16 +188,16 @@ TEST_F(CliMask, OddPicturesStayOdd) {
   }
 }
 
-TEST_F(CliMask, PicturesOfOnePixel) {
+TEST_F(CliMask, ImagesOfOnePixel) {
   const std::string track = Resized("photo_astronaut", 1, 1);
   const std::string texture = Save("texture.png", FourColours());
   for (const char* format : {"bgr24", "nv21"}) {
-    const Picture masked =
+    const Image masked =
         Masked(Save("photo.png", Plain(1, 1, 9)), track, texture, {"--format", format});
     EXPECT_EQ(masked.rgba.size(), 4u) << format;
   }
   // A texture of one pixel has no neighbours to blend and draws nothing.
-  const Picture photo = Plain(512, 512, 30);
+  const Image photo = Plain(512, 512, 30);
   EXPECT_EQ(Masked(Save("photo.png", photo), astronaut_, Save("one.png", Plain(1, 1, 200))).rgba,
             photo.rgba);
 }
@@ -213,15 +213,15 @@ TEST_F(CliMask, RefusesWhatItCannotUse) {
     arguments.insert(arguments.end(), more.begin(), more.end());
     ExpectFailure(arguments, kFailed, text);
   };
-  refused(folder_.Path("none.png"), astronaut_, texture, "none.png: the picture cannot be opened");
+  refused(folder_.Path("none.png"), astronaut_, texture, "none.png: the image cannot be opened");
   refused(astronaut_, astronaut_, texture, "neither a PNG nor a JPEG");
   refused(Save("small.png", Plain(511, 512, 1)), astronaut_, texture,
-          "small.png: the picture has 511 x 512 pixels, the track 512 x 512");
+          "small.png: the image has 511 x 512 pixels, the track 512 x 512");
   refused(photo, folder_.Path("none"), texture, "none: the file cannot be opened");
   refused(photo, Damaged(2, "?"), texture, ":2: not valid JSON");
-  refused(photo, astronaut_, folder_.Path("none.png"), "none.png: the picture cannot be opened");
+  refused(photo, astronaut_, folder_.Path("none.png"), "none.png: the image cannot be opened");
   refused(photo, astronaut_, astronaut_, "neither a PNG nor a JPEG");
-  refused(photo, astronaut_, texture, "there is no frame 7", {"--frame", "7"});
+  refused(photo, astronaut_, texture, "no frame 7", {"--frame", "7"});
   refused(photo, astronaut_, texture, "m.bin: a face model has 2141796 bytes, this file has 8",
           {"--model", console_.Write("m.bin", "no model")});
 
@@ -248,7 +248,7 @@ TEST_F(CliMask, WritesWhatTheEndingAsksFor) {
   const Outcome outcome = Run(mask(folder_.Path("a.jpg")));
   EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
   EXPECT_EQ(folder_.Read("a.jpg").substr(0, 2), "\xff\xd8");
-  EXPECT_EQ(ReadPicture(folder_.Path("a.jpg")).width, 512);
+  EXPECT_EQ(ReadImage(folder_.Path("a.jpg")).width, 512);
   ExpectFailure(mask(folder_.Path("a.gif")), kUsage,
                 "a.gif: unknown ending .gif (known: .png, .jpg, .jpeg)", {"a.jpg"});
   ExpectFailure(mask(photo), kUsage, "is also an input", {"a.jpg"});

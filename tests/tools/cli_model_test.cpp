@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <sstream>
 
-#include "render/picture.h"
+#include "render/image.h"
 #include "tool_test.h"
 
 namespace n3ds::tool {
@@ -33,7 +33,7 @@ class CliModel : public ToolTest {
 };
 
 // Pixels that differ by more than rounding.
-std::size_t CountDifferences(const Picture& a, const Picture& b) {
+std::size_t CountDifferences(const Image& a, const Image& b) {
   std::size_t count = 0;
   for (std::size_t i = 0; i < a.rgba.size(); i += 4) {
     if (std::abs(int{a.rgba[i]} - int{b.rgba[i]}) > 3) ++count;
@@ -67,19 +67,19 @@ TEST_F(CliModel, RenderDrawsAFaceFromSeveralSides) {
       Run({"model", "render", kModel, "--out", png, "--views", "3", "--size", "120"});
   ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
   EXPECT_THAT(folder_.Names(), ElementsAre("a.png"));
-  const Picture picture = ReadPicture(png);
-  ASSERT_EQ(picture.width, 360);
-  ASSERT_EQ(picture.height, 120);
+  const Image image = ReadImage(png);
+  ASSERT_EQ(image.width, 360);
+  ASSERT_EQ(image.height, 120);
   // Skin in the middle of the front view, ground in its corner; the nose of a profile points away
   // from the middle view, so the outer views are bright on their outer half.
-  EXPECT_GT(picture.Pixel(180, 60)[0], picture.Pixel(180, 60)[2]);
-  EXPECT_GT(picture.Pixel(180, 60)[0], 100);
-  EXPECT_LT(picture.Pixel(122, 2)[0], 60);
+  EXPECT_GT(image.Pixel(180, 60)[0], image.Pixel(180, 60)[2]);
+  EXPECT_GT(image.Pixel(180, 60)[0], 100);
+  EXPECT_LT(image.Pixel(122, 2)[0], 60);
   const auto skin = [&](int left, int right) {
     int count = 0;
-    for (int y = 0; y < picture.height; ++y) {
+    for (int y = 0; y < image.height; ++y) {
       for (int x = left; x < right; ++x) {
-        if (picture.Pixel(x, y)[0] > picture.Pixel(x, y)[2] + 8) ++count;
+        if (image.Pixel(x, y)[0] > image.Pixel(x, y)[2] + 8) ++count;
       }
     }
     return count;
@@ -95,12 +95,12 @@ TEST_F(CliModel, RenderShowsIdentityAndExpression) {
     arguments.insert(arguments.end(), options.begin(), options.end());
     const Outcome outcome = Run(arguments);
     EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
-    return ReadPicture(folder_.Path("a.png"));
+    return ReadImage(folder_.Path("a.png"));
   };
-  const Picture mean = draw({});
+  const Image mean = draw({});
   EXPECT_EQ(CountDifferences(mean, draw({"--identity", "1=0"})), 0u);
   EXPECT_GT(CountDifferences(mean, draw({"--identity", "1=2.5"})), 400u);
-  const Picture open = draw({"--expression", "jaw_open=1"});
+  const Image open = draw({"--expression", "jaw_open=1"});
   EXPECT_GT(CountDifferences(mean, open), 400u);
   EXPECT_LT(open.Pixel(80, 120)[0], mean.Pixel(80, 120)[0]);  // into the mouth
 }

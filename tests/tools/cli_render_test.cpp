@@ -5,7 +5,7 @@
 
 #include <cstdlib>
 
-#include "render/picture.h"
+#include "render/image.h"
 #include "tool_test.h"
 
 namespace n3ds::tool {
@@ -15,31 +15,31 @@ using ::testing::ElementsAre;
 
 using CliRender = ToolTest;
 
-TEST_F(CliRender, MakesAPicture) {
+TEST_F(CliRender, MakesAImage) {
   const Outcome outcome = Run({"render", ExampleTrack("real_head_move_90"), "--frame", "3",
                                "--size", "320x320", "--out", folder_.Path("a.png")});
   ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
   EXPECT_THAT(folder_.Names(), ElementsAre("a.png"));
-  const Picture picture = ReadPicture(folder_.Path("a.png"));
-  EXPECT_EQ(picture.width, 320);  // upright: 640 x 480
-  EXPECT_EQ(picture.height, 240);
+  const Image image = ReadImage(folder_.Path("a.png"));
+  EXPECT_EQ(image.width, 320);  // upright: 640 x 480
+  EXPECT_EQ(image.height, 240);
 }
 
 TEST_F(CliRender, MakesAContactSheet) {
   const Outcome outcome = Run({"render", ExampleTrack("synthetic_three"), "--contact-sheet", "6",
                                "--size", "160x160", "--out", folder_.Path("sheet.png")});
   ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  const Picture picture = ReadPicture(folder_.Path("sheet.png"));
-  EXPECT_EQ((picture.width + 4) / 164 * ((picture.height + 4) / 94), 6);
+  const Image image = ReadImage(folder_.Path("sheet.png"));
+  EXPECT_EQ((image.width + 4) / 164 * ((image.height + 4) / 94), 6);
 }
 
 TEST_F(CliRender, ShowsTheHeadsAlone) {
   const Outcome outcome = Run({"render", ExampleTrack("synthetic_talk_165"), "--closeup", "--size",
                                "200x240", "--out", folder_.Path("a.png")});
   ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  const Picture picture = ReadPicture(folder_.Path("a.png"));
-  EXPECT_TRUE(picture.width == 200 || picture.height == 240);
-  EXPECT_LT(picture.width, picture.height);  // the track's pictures are broad, a head is not
+  const Image image = ReadImage(folder_.Path("a.png"));
+  EXPECT_TRUE(image.width == 200 || image.height == 240);
+  EXPECT_LT(image.width, image.height);  // the track's images are broad, a head is not
   const Outcome film = Run({"render", ExampleTrack("synthetic_talk_165"), "--closeup", "--size",
                             "99x101", "--every", "10", "--out", folder_.Path("a.mp4")});
   EXPECT_EQ(film.exit_code, 0) << film.err;
@@ -66,14 +66,14 @@ TEST_F(CliRender, MakesAFilm) {
 }
 
 TEST_F(CliRender, DrawsOverAPhoto) {
-  Picture photo(320, 320);
+  Image photo(320, 320);
   for (std::size_t i = 0; i < photo.rgba.size(); ++i) photo.rgba[i] = i % 4 == 3 ? 255 : 90;
   WritePng(console_.Path("photo.png"), photo);
   const Outcome outcome =
       Run({"render", ExampleTrack("photo_astronaut"), "--image", console_.Path("photo.png"),
            "--size", "320x320", "--out", folder_.Path("a.png")});
   ASSERT_EQ(outcome.exit_code, 0) << outcome.err;
-  const Picture drawn = ReadPicture(folder_.Path("a.png"));
+  const Image drawn = ReadImage(folder_.Path("a.png"));
   EXPECT_EQ(drawn.Pixel(5, 300)[0], 90);  // the ground is the photo
   std::size_t changed = 0;
   for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) changed += drawn.rgba[i] != 90 ? 1U : 0U;
@@ -83,8 +83,7 @@ TEST_F(CliRender, DrawsOverAPhoto) {
 TEST_F(CliRender, RefusesWhatItCannotDraw) {
   const std::string track = ExampleTrack("real_man_270_mirror");
   const std::string png = folder_.Path("a.png");
-  ExpectFailure({"render", track, "--out", png, "--frame", "999"}, kFailed,
-                "there is no frame 999");
+  ExpectFailure({"render", track, "--out", png, "--frame", "999"}, kFailed, "no frame 999");
   ExpectFailure({"render", track, "--out", png, "--frame", "1", "--contact-sheet", "4"}, kUsage,
                 "exclude each other");
   ExpectFailure({"render", track, "--out", folder_.Path("a.mp4"), "--frame", "1"}, kUsage,
@@ -95,10 +94,10 @@ TEST_F(CliRender, RefusesWhatItCannotDraw) {
   ExpectFailure({"render", track, "--out", png, "--image", track}, kFailed,
                 "neither a PNG nor a JPEG");
   ExpectFailure({"render", track, "--out", png, "--image", folder_.Path("none.jpg")}, kFailed,
-                "none.jpg: the picture cannot be opened");
-  WritePng(console_.Path("square.png"), Picture(50, 50));
+                "none.jpg: the image cannot be opened");
+  WritePng(console_.Path("square.png"), Image(50, 50));
   ExpectFailure({"render", track, "--out", png, "--image", console_.Path("square.png")}, kFailed,
-                "the picture has 50 x 50 pixels, the track 270 x 480");
+                "the image has 50 x 50 pixels, the track 270 x 480");
   ExpectFailure({"render", Damaged(2, "?"), "--out", png}, kFailed, ":2: not valid JSON");
   ExpectFailure({"render", track, "--out", folder_.Path("missing/a.png")}, kFailed,
                 "missing/a.png: cannot be written");
@@ -110,11 +109,11 @@ TEST_F(CliRender, WritesJpegWhereJpegIsAskedFor) {
     const Outcome outcome =
         Run({"render", track, "--size", "200x200", "--out", folder_.Path(name)});
     EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
-    return ReadPicture(folder_.Path(name));
+    return ReadImage(folder_.Path(name));
   };
-  const Picture png = draw("a.png");
+  const Image png = draw("a.png");
   for (const char* name : {"a.jpg", "b.JPEG"}) {
-    const Picture jpeg = draw(name);
+    const Image jpeg = draw(name);
     EXPECT_EQ(folder_.Read(name).substr(0, 2), "\xff\xd8");
     ASSERT_EQ(jpeg.rgba.size(), png.rgba.size());
     double difference = 0;
@@ -143,7 +142,7 @@ TEST_F(CliRender, RefusesEndingsItCannotWrite) {
 
 TEST_F(CliRender, RefusesToReplaceItsInput) {
   const std::string track = ExampleTrack("photo_astronaut");
-  WritePng(console_.Path("photo.png"), Picture(512, 512));
+  WritePng(console_.Path("photo.png"), Image(512, 512));
   std::filesystem::create_symlink("photo.png", console_.Path("link.png"));
   ExpectFailure(
       {"render", track, "--image", console_.Path("photo.png"), "--out", console_.Path("link.png")},
@@ -161,7 +160,7 @@ TEST_F(CliRender, DrawsStickersAlone) {
                                           "--out",  folder_.Path("a.png")};
     arguments.insert(arguments.end(), more.begin(), more.end());
     EXPECT_EQ(Run(arguments).exit_code, 0);
-    return ReadPicture(folder_.Path("a.png")).rgba;
+    return ReadImage(folder_.Path("a.png")).rgba;
   };
   const auto plain = draw({});
   EXPECT_EQ(plain, draw({"--draw", "hat,glasses,head"}));
@@ -177,7 +176,7 @@ TEST_F(CliRender, DrawsTheDenseMesh) {
     arguments.insert(arguments.end(), more.begin(), more.end());
     const Outcome outcome = Run(arguments);
     EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
-    const Picture drawn = ReadPicture(folder_.Path("a.png"));
+    const Image drawn = ReadImage(folder_.Path("a.png"));
     // The ground is grey with a touch of blue.
     std::size_t count = 0;
     for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) {
@@ -185,7 +184,7 @@ TEST_F(CliRender, DrawsTheDenseMesh) {
     }
     return count;
   };
-  Picture red(16, 16);
+  Image red(16, 16);
   for (std::size_t i = 0; i < red.rgba.size(); ++i)
     red.rgba[i] = i % 4 == 0 || i % 4 == 3 ? 255 : 0;
   WritePng(console_.Path("red.png"), red);
@@ -210,7 +209,7 @@ TEST_F(CliRender, DenseMeshesNeedMaskMode) {
                 "neither a PNG nor a JPEG");
   ExpectFailure(
       {"render", track, "--out", png, "--mode", "mask", "--texture", folder_.Path("none.png")},
-      kFailed, "none.png: the picture cannot be opened");
+      kFailed, "none.png: the image cannot be opened");
 }
 
 TEST_F(CliRender, AFilmThatCannotBeMadeLeavesNothing) {

@@ -68,7 +68,7 @@ class MeshMetrics : public ::testing::Test {
 
   PixelPoint Drawn(std::size_t landmark) const {
     const Vector3 v = VerticesOfCorners(face_.corners)[LandmarkVertices()[landmark]];
-    return ProjectToPicture(face_, header_, v[0], v[1], v[2]);
+    return ProjectToImage(face_, header_, v[0], v[1], v[2]);
   }
 
   // Landmarks where the mesh of now is drawn, rounded to pixels; pupils at a known distance.
@@ -163,7 +163,7 @@ TEST_F(MeshMetrics, TheTrueYawCountsWhereItIsKnown) {
   EXPECT_THAT(Judge().distances, SizeIs(76));
 }
 
-TEST_F(MeshMetrics, NumbersThatAreNoneAreCounted) {
+TEST_F(MeshMetrics, CountsNonFiniteValues) {
   SeeTheMesh();
   face_.corners[777] = std::numeric_limits<float>::quiet_NaN();
   const MeshScore score = Judge();

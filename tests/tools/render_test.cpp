@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Pictures, meshes and the scene.
+// Images, meshes and the scene.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -12,8 +12,8 @@
 #include "engine/engine_session.h"
 #include "mesh/face_tables.h"
 #include "render/contact_sheet.h"
+#include "render/image.h"
 #include "render/obj_file.h"
-#include "render/picture.h"
 #include "render/scene.h"
 #include "render/shapes.h"
 #include "render/view.h"
@@ -27,17 +27,17 @@ namespace {
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 
-Picture Pattern(int width, int height) {
-  Picture picture(width, height);
+Image Pattern(int width, int height) {
+  Image image(width, height);
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
-      std::uint8_t* pixel = picture.Pixel(x, y);
+      std::uint8_t* pixel = image.Pixel(x, y);
       pixel[0] = static_cast<std::uint8_t>(37 * x + 11);
       pixel[1] = static_cast<std::uint8_t>(59 * y + 7);
       pixel[2] = static_cast<std::uint8_t>(x * y);
     }
   }
-  return picture;
+  return image;
 }
 
 template <typename Function>
@@ -50,37 +50,37 @@ std::string Message(Function function) {
   return "";
 }
 
-TEST(Picture, PngReadsBack) {
+TEST(Image, PngReadsBack) {
   const ScratchFolder folder;
-  const Picture picture = Pattern(7, 5);
-  WritePng(folder.Path("a.png"), picture);
-  const Picture again = ReadPicture(folder.Path("a.png"));
+  const Image image = Pattern(7, 5);
+  WritePng(folder.Path("a.png"), image);
+  const Image again = ReadImage(folder.Path("a.png"));
   EXPECT_EQ(again.width, 7);
   EXPECT_EQ(again.height, 5);
-  EXPECT_EQ(again.rgba, picture.rgba);
+  EXPECT_EQ(again.rgba, image.rgba);
   EXPECT_THAT(folder.Names(), ElementsAre("a.png"));
 }
 
-TEST(Picture, RefusesWhatIsNoWholePicture) {
+TEST(Image, RejectsTruncatedImages) {
   const ScratchFolder folder;
   WritePng(folder.Path("a.png"), Pattern(40, 30));
   const std::string bytes = folder.Read("a.png");
   const auto refusal = [&](const std::string& content) {
     const std::string path = folder.Write("b.png", content);
-    return Message([&] { ReadPicture(path); });
+    return Message([&] { ReadImage(path); });
   };
-  EXPECT_THAT(refusal(bytes.substr(0, bytes.size() / 2)), HasSubstr("not a whole PNG file"));
-  EXPECT_THAT(refusal(bytes.substr(0, 20)), HasSubstr("not a whole PNG file"));
-  EXPECT_THAT(refusal("\xff\xd8 nothing"), HasSubstr("not a whole JPEG file"));
+  EXPECT_THAT(refusal(bytes.substr(0, bytes.size() / 2)),
+              HasSubstr("truncated or damaged PNG file"));
+  EXPECT_THAT(refusal(bytes.substr(0, 20)), HasSubstr("truncated or damaged PNG file"));
+  EXPECT_THAT(refusal("\xff\xd8 nothing"), HasSubstr("truncated or damaged JPEG file"));
   EXPECT_THAT(refusal("GIF89a"), HasSubstr("neither a PNG nor a JPEG"));
   EXPECT_THAT(refusal(""), HasSubstr("cannot be read"));
-  EXPECT_THAT(Message([&] { ReadPicture(folder.Path("none.png")); }),
-              HasSubstr("cannot be opened"));
+  EXPECT_THAT(Message([&] { ReadImage(folder.Path("none.png")); }), HasSubstr("cannot be opened"));
 }
 
 // The middle of each pixel goes where a landmark on it goes.
-TEST(Picture, TurnsLikeTheLandmarks) {
-  const Picture delivered = Pattern(9, 6);
+TEST(Image, TurnsLikeTheLandmarks) {
+  const Image delivered = Pattern(9, 6);
   for (const int degree : {0, 90, 180, 270}) {
     for (const int mirror : {0, 1}) {
       TrackHeader header;
@@ -88,7 +88,7 @@ TEST(Picture, TurnsLikeTheLandmarks) {
       header.height = delivered.height;
       header.degree = degree;
       header.mirror = mirror;
-      const Picture upright = Upright(delivered, degree, mirror == 1);
+      const Image upright = Upright(delivered, degree, mirror == 1);
       EXPECT_EQ(upright.width, header.upright_width());
       EXPECT_EQ(upright.height, header.upright_height());
       for (int y = 0; y < delivered.height; ++y) {
@@ -113,10 +113,10 @@ TEST(ContactSheet, ChoosesEvenlySpacedFrames) {
 TEST(ContactSheet, LaysTilesOutInAGrid) {
   ContactSheet sheet(12, 160, 90);
   for (int i = 0; i < 12; ++i) sheet.Add(Pattern(160, 90), 25 * i);
-  EXPECT_GE(sheet.picture().width, 3 * 160);
-  EXPECT_GE(sheet.picture().height, 2 * 90);
-  EXPECT_EQ((sheet.picture().width + 4) % 164, 0);
-  EXPECT_EQ((sheet.picture().height + 4) % 94, 0);
+  EXPECT_GE(sheet.image().width, 3 * 160);
+  EXPECT_GE(sheet.image().height, 2 * 90);
+  EXPECT_EQ((sheet.image().width + 4) % 164, 0);
+  EXPECT_EQ((sheet.image().height + 4) % 94, 0);
 }
 
 TEST(ObjFile, ReadsPartsWithMaterials) {
@@ -142,7 +142,7 @@ TEST(ObjFile, NamesTheLineOfAMistake) {
     const std::string path = folder.Write("a.obj", text);
     return Message([&] { ReadObj(path); });
   };
-  EXPECT_THAT(refusal("v 0 0 0\nv 1 x 0\n"), HasSubstr("a.obj:2: three numbers are needed"));
+  EXPECT_THAT(refusal("v 0 0 0\nv 1 x 0\n"), HasSubstr("a.obj:2: expected three numbers"));
   EXPECT_THAT(refusal("v 0 0 0\nvn 0 0 1\nf 1//1 1//1\n"), HasSubstr(":3: a face has fewer"));
   EXPECT_THAT(refusal("v 0 0 0\nvn 0 0 1\nf 1//1 2//1 1//1\n"),
               HasSubstr(":3: there is no entry 2"));
@@ -151,7 +151,7 @@ TEST(ObjFile, NamesTheLineOfAMistake) {
   EXPECT_THAT(refusal("v 0 0 0\nf 1 1 1\n"), HasSubstr(":2: corner 1 has no normal"));
   EXPECT_THAT(refusal("usemtl gold\n"), HasSubstr(":1: there is no material gold"));
   EXPECT_THAT(refusal("mtllib none.mtl\n"), HasSubstr("none.mtl: cannot be opened"));
-  EXPECT_THAT(refusal(""), HasSubstr("there is no face in it"));
+  EXPECT_THAT(refusal(""), HasSubstr("file contains no faces"));
 }
 
 double Length(const std::array<float, 3>& v) {
@@ -189,8 +189,8 @@ TEST(Assets, GlassesStandBeforeTheFace) {
   }
 }
 
-// Mean of some landmarks' places in a mask picture, as its alpha there.
-int MaskAlpha(const Picture& mask, std::size_t first, std::size_t last) {
+// Mean of some landmarks' places in a mask image, as its alpha there.
+int MaskAlpha(const Image& mask, std::size_t first, std::size_t last) {
   double u = 0;
   double v = 0;
   for (std::size_t k = first; k <= last; ++k) {
@@ -206,7 +206,7 @@ int MaskAlpha(const Picture& mask, std::size_t first, std::size_t last) {
 TEST(Assets, MasksFitTheTextureLayout) {
   for (const char* name : {"carnival", "tiger", "gold"}) {
     const std::string path = std::string(N3DS_SOURCE_DIR "/examples/assets/mask_") + name + ".png";
-    const Picture mask = ReadPicture(path);
+    const Image mask = ReadImage(path);
     EXPECT_EQ(mask.width, 512);
     EXPECT_EQ(mask.height, 512);
     EXPECT_LT(std::filesystem::file_size(path), 250000u);
@@ -247,7 +247,7 @@ TEST(Shapes, SkullLiesUnderTheForehead) {
   }
 }
 
-TEST(View, TheWholePictureGoesIntoTheBox) {
+TEST(View, TheWholeImageGoesIntoTheBox) {
   TrackHeader header;
   header.width = 400;
   header.height = 1000;
@@ -293,8 +293,8 @@ TEST(View, CutsItsPart) {
   view.left = 2;
   view.top = 1;
   view.shown = {5, 3};
-  const Picture whole = Pattern(9, 6);
-  const Picture cut = view.Cut(whole);
+  const Image whole = Pattern(9, 6);
+  const Image cut = view.Cut(whole);
   ASSERT_EQ(cut.width, 5);
   ASSERT_EQ(cut.height, 3);
   for (int y = 0; y < 3; ++y) {
@@ -304,7 +304,7 @@ TEST(View, CutsItsPart) {
   }
 }
 
-// What a part of the scene adds to the picture: its pixels' bounding box.
+// What a part of the scene adds to the image: its pixels' bounding box.
 struct Extent {
   int left = 1 << 20;
   int top = 1 << 20;
@@ -313,7 +313,7 @@ struct Extent {
   int pixels = 0;
 };
 
-Extent Difference(const Picture& a, const Picture& b) {
+Extent Difference(const Image& a, const Image& b) {
   Extent extent;
   for (int y = 0; y < a.height; ++y) {
     for (int x = 0; x < a.width; ++x) {
@@ -328,7 +328,7 @@ Extent Difference(const Picture& a, const Picture& b) {
   return extent;
 }
 
-// A frontal head 700 mm before the camera of a 640 x 480 picture, its middle at (400, 200).
+// A frontal head 700 mm before the camera of a 640 x 480 image, its middle at (400, 200).
 FrameResult FrontalHead() {
   const float focal = 560;
   FaceResult face;
@@ -352,14 +352,14 @@ TrackHeader SmallHeader() {
   return header;
 }
 
-Picture DrawParts(const FrameResult& frame, const SceneParts& parts) {
+Image DrawParts(const FrameResult& frame, const SceneParts& parts) {
   Scene scene(SmallHeader(), DefaultModelPath(), parts, std::nullopt, 640, 480);
   return scene.Draw(frame);
 }
 
 constexpr SceneParts kNothing = {false, false, false, false, false};
 
-// Where the vertices of an asset lie in the picture, as continuous pixel coordinates.
+// Where the vertices of an asset lie in the image, as continuous pixel coordinates.
 struct Outline {
   double left = 1e9;
   double top = 1e9;
@@ -384,7 +384,7 @@ Outline Projected(const char* asset, const FaceResult& face) {
 TEST(Scene, DrawsStickersWhereTheMatricesSay) {
   constexpr double kPixels = 1.5;
   const FrameResult frame = FrontalHead();
-  const Picture empty = DrawParts(frame, kNothing);
+  const Image empty = DrawParts(frame, kNothing);
   SceneParts parts = kNothing;
   parts.hat = true;
   const Extent hat = Difference(empty, DrawParts(frame, parts));
@@ -404,10 +404,10 @@ TEST(Scene, DrawsStickersWhereTheMatricesSay) {
   EXPECT_GT(glasses.top, hat.top);
 }
 
-TEST(Scene, ThePlainPictureIsTheBackground) {
-  Picture photo = Pattern(640, 480);
+TEST(Scene, ThePlainImageIsTheBackground) {
+  Image photo = Pattern(640, 480);
   Scene scene(SmallHeader(), DefaultModelPath(), kNothing, photo, 640, 480);
-  const Picture drawn = scene.Draw(FrontalHead());
+  const Image drawn = scene.Draw(FrontalHead());
   EXPECT_EQ(drawn.rgba, photo.rgba);
 }
 
@@ -416,7 +416,7 @@ TEST(Scene, TheHeadHidesWhatIsBehindIt) {
   FrameResult frame = FrontalHead();
   const Extent before = [&] {
     SceneParts parts = kNothing;
-    const Picture empty = DrawParts(frame, parts);
+    const Image empty = DrawParts(frame, parts);
     parts.glasses = true;
     return Difference(empty, DrawParts(frame, parts));
   }();
@@ -424,7 +424,7 @@ TEST(Scene, TheHeadHidesWhatIsBehindIt) {
   model[0] = -1;
   model[10] = -1;
   SceneParts parts = kNothing;
-  const Picture empty = DrawParts(frame, parts);
+  const Image empty = DrawParts(frame, parts);
   parts.glasses = true;
   const Extent behind = Difference(empty, DrawParts(frame, parts));
   EXPECT_LT(behind.pixels, before.pixels / 8);
@@ -433,12 +433,12 @@ TEST(Scene, TheHeadHidesWhatIsBehindIt) {
 TEST(Scene, NearerHeadsHideFartherOnes) {
   FrameResult frame = FrontalHead();
   FaceResult far = frame.faces[0];
-  far.model[14] = -800;  // 1300 mm away, behind the other in the picture
+  far.model[14] = -800;  // 1300 mm away, behind the other in the image
   far.model[12] = 100.0F * 1300 / 700;
   far.model[13] = 50.0F * 1300 / 700;
   SceneParts parts = kNothing;
   parts.head = true;
-  const Picture near_alone = DrawParts(frame, parts);
+  const Image near_alone = DrawParts(frame, parts);
   frame.faces.insert(frame.faces.begin(), far);
   const Extent added = Difference(near_alone, DrawParts(frame, parts));
   EXPECT_LT(added.pixels, 50);
@@ -447,7 +447,7 @@ TEST(Scene, NearerHeadsHideFartherOnes) {
 TEST(Scene, LeavesOutFacesWithoutAPose) {
   FrameResult frame = FrontalHead();
   const SceneParts parts;
-  const Picture empty = DrawParts({}, parts);
+  const Image empty = DrawParts({}, parts);
   frame.faces[0].model[12] = std::numeric_limits<float>::quiet_NaN();
   EXPECT_EQ(DrawParts(frame, parts).rgba, empty.rgba);
 }
@@ -480,39 +480,39 @@ class MaskScene : public ::testing::Test {
     coordinates_ = session.texture_coordinates();
   }
 
-  Picture Draw(const SceneParts& parts, const std::optional<Picture>& mask = std::nullopt) const {
+  Image Draw(const SceneParts& parts, const std::optional<Image>& mask = std::nullopt) const {
     Scene scene(track_.header, DefaultModelPath(), parts, std::nullopt, 640, 480, mask);
     return scene.Draw(result_, coordinates_);
   }
 
-  // The landmark as the upright picture has it.
+  // The landmark as the upright image has it.
   PixelPoint Seen(std::size_t landmark) const {
     return UprightLandmarks(track_.header, track_.frames[29].faces[0])[landmark];
   }
 
   // Colour between landmarks, in the middle of them.
-  std::array<int, 3> Between(const Picture& picture, const std::vector<std::size_t>& landmarks) {
+  std::array<int, 3> Between(const Image& image, const std::vector<std::size_t>& landmarks) {
     double x = 0;
     double y = 0;
     for (const std::size_t k : landmarks) {
       x += Seen(k).x / static_cast<double>(landmarks.size());
       y += Seen(k).y / static_cast<double>(landmarks.size());
     }
-    const std::uint8_t* p = picture.Pixel(static_cast<int>(x), static_cast<int>(y));
+    const std::uint8_t* p = image.Pixel(static_cast<int>(x), static_cast<int>(y));
     return {p[0], p[1], p[2]};
   }
 
-  static Picture Quarters() {
-    Picture picture(64, 64);
+  static Image Quarters() {
+    Image image(64, 64);
     for (int y = 0; y < 64; ++y) {
       for (int x = 0; x < 64; ++x) {
-        std::uint8_t* p = picture.Pixel(x, y);
+        std::uint8_t* p = image.Pixel(x, y);
         p[0] = x < 32 ? 250 : 0;
         p[1] = y < 32 ? 250 : 0;
         p[2] = 0;
       }
     }
-    return picture;
+    return image;
   }
 
   Track track_;
@@ -521,7 +521,7 @@ class MaskScene : public ::testing::Test {
 };
 
 TEST_F(MaskScene, TheTextureIsNeitherMirroredNorTurned) {
-  const Picture drawn = Draw(kNothing, Quarters());
+  const Image drawn = Draw(kNothing, Quarters());
   const auto left_brow = Between(drawn, {21, 22, 26, 27});
   const auto right_brow = Between(drawn, {31, 32, 36, 37});
   const auto left_cheek = Between(drawn, {75, 3});
@@ -537,22 +537,22 @@ TEST_F(MaskScene, TheTextureIsNeitherMirroredNorTurned) {
 }
 
 TEST_F(MaskScene, EyesAndAnOpenMouthShowTheGround) {
-  const Picture empty = Draw(kNothing);
-  const Picture drawn = Draw(kNothing, Quarters());
+  const Image empty = Draw(kNothing);
+  const Image drawn = Draw(kNothing, Quarters());
   EXPECT_EQ(Between(drawn, {89, 93}), Between(empty, {89, 93}));
   EXPECT_EQ(Between(drawn, {42, 48}), Between(empty, {42, 48}));
   EXPECT_EQ(Between(drawn, {54, 60}), Between(empty, {54, 60}));
 }
 
 TEST_F(MaskScene, WhatIsTransparentLeavesNoTrace) {
-  Picture clear(64, 64);  // white
+  Image clear(64, 64);  // white
   for (std::size_t i = 3; i < clear.rgba.size(); i += 4) clear.rgba[i] = 0;
   EXPECT_EQ(Draw(kNothing, clear).rgba, Draw(kNothing).rgba);
 }
 
 TEST_F(MaskScene, TheWireframeCoversTheMeshThinly) {
   SceneParts parts = kNothing;
-  const Picture empty = Draw(parts);
+  const Image empty = Draw(parts);
   parts.mesh = true;
   const Extent mesh = Difference(empty, Draw(parts));
   parts.mesh = false;
@@ -583,11 +583,11 @@ TEST_F(MaskScene, StickersSitAsInRigidMode) {
   EXPECT_NEAR(in_mask.bottom, in_rigid.bottom, 12);
 }
 
-TEST(Scene, DrawsTheSamePictureTwice) {
+TEST(Scene, DrawsTheSameImageTwice) {
   const FrameResult frame = FrontalHead();
   const SceneParts parts;
   Scene scene(SmallHeader(), DefaultModelPath(), parts, std::nullopt, 320, 240);
-  const Picture first = scene.Draw(frame);
+  const Image first = scene.Draw(frame);
   EXPECT_EQ(scene.Draw(frame).rgba, first.rgba);
 }
 

@@ -11,10 +11,10 @@
 #include <limits>
 #include <sstream>
 
-#include "model/face_model_file.h"
-#include "engine/results_file.h"
 #include "core/output_matrices.h"
+#include "engine/results_file.h"
 #include "eval/text_table.h"
+#include "model/face_model_file.h"
 #include "scratch_folder.h"
 #include "support/atomic_file.h"
 

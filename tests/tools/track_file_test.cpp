@@ -94,7 +94,7 @@ TEST(TrackFile, TakesALastLineWithoutNewlineAndWindowsLineEnds) {
   EXPECT_EQ(Refusal(std::string(kHeader) + "\r\n" + Frame(0, "") + "\r\n" + Frame(1, "")), "");
 }
 
-TEST(TrackFile, TakesPointsOutsideThePictureAndExtraFields) {
+TEST(TrackFile, TakesPointsOutsideTheImageAndExtraFields) {
   const std::string face = Replaced(Face(1, R"("colour":"blue")"), "[0,1,", "[-50,99999,");
   const Track track = Read(std::string(kHeader) + "\n" + Frame(0, face));
   EXPECT_EQ(track.frames[0].faces[0].points[0], -50);

@@ -38,7 +38,7 @@ TEST(Upright, MirrorsBeforeItTurns) {
   ExpectUpright(Header(270, 1), 20, 10);
 }
 
-TEST(Upright, SizeIsThatOfTheTurnedPicture) {
+TEST(Upright, SizeIsThatOfTheTurnedImage) {
   EXPECT_EQ(Header(90, 0).upright_width(), 480);
   EXPECT_EQ(Header(90, 0).upright_height(), 640);
   EXPECT_EQ(Header(180, 1).upright_width(), 640);
@@ -57,7 +57,7 @@ TEST(Upright, MirroringLandmarksTwiceRestoresThem) {
   }
 }
 
-TEST(Upright, LandmarksOnTheMiddleLineStay) {
+TEST(Upright, LandmarksOnTheMidlineStay) {
   std::set<int> fixed;
   for (int k = 0; k < 165; ++k) {
     if (MirrorLandmark(k, 165) == k) fixed.insert(k);

@@ -25,7 +25,7 @@ std::size_t ChosenFrame(const Track& track, const std::string& path,
     const TrackFrame& frame = track.frames[f];
     if (number ? frame.number == *number : !frame.faces.empty()) return f;
   }
-  if (number) throw Error(path + ": there is no frame " + std::to_string(*number));
+  if (number) throw Error(path + ": no frame " + std::to_string(*number));
   return 0;
 }
 

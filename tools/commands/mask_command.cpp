@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// n3ds mask: a mask picture on the faces of a photo, through the library's own image functions.
+// n3ds mask: a mask image on the faces of a photo, through the library's own image functions.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
@@ -16,8 +16,8 @@
 #include "commands/outputs.h"
 #include "engine/core_session.h"
 #include "engine/engine_session.h"
-#include "render/camera_picture.h"
-#include "render/picture.h"
+#include "render/camera_image.h"
+#include "render/image.h"
 #include "support/data_files.h"
 #include "support/error.h"
 #include "tracks/track_file.h"
@@ -25,11 +25,11 @@
 namespace n3ds::tool {
 namespace {
 
-using Convert = CameraPicture (*)(const Picture&);
+using Convert = CameraImage (*)(const Image&);
 
 const std::map<std::string, Convert>& Formats() {
-  static const std::map<std::string, Convert> formats = {{"bgr24", CameraPicture::Bgr24},
-                                                         {"nv21", CameraPicture::Nv21}};
+  static const std::map<std::string, Convert> formats = {{"bgr24", CameraImage::Bgr24},
+                                                         {"nv21", CameraImage::Nv21}};
   return formats;
 }
 
@@ -44,11 +44,11 @@ struct MaskOptions {
   std::size_t settle = 20;
 };
 
-// The photo as the landmarks see it: their pixels are those of the track's picture.
-Picture LoadPhoto(const MaskOptions& options, const TrackHeader& header) {
-  const Picture photo = ReadPicture(options.photo);
+// The photo as the landmarks see it: their pixels are those of the track's image.
+Image LoadPhoto(const MaskOptions& options, const TrackHeader& header) {
+  const Image photo = ReadImage(options.photo);
   if (photo.width != header.width || photo.height != header.height) {
-    throw Error(options.photo + ": the picture has " + std::to_string(photo.width) + " x " +
+    throw Error(options.photo + ": the image has " + std::to_string(photo.width) + " x " +
                 std::to_string(photo.height) + " pixels, the track " +
                 std::to_string(header.width) + " x " + std::to_string(header.height));
   }
@@ -66,19 +66,19 @@ void RunMaskCommand(const MaskOptions& options) {
     throw Error(options.track + ": frame " + std::to_string(track.frames[chosen].number) +
                 " has no face to put a mask on");
   }
-  const Picture photo = LoadPhoto(options, track.header);
-  CameraPicture texture = CameraPicture::Bgra32(ReadPicture(options.texture));
+  const Image photo = LoadPhoto(options, track.header);
+  CameraImage texture = CameraImage::Bgra32(ReadImage(options.texture));
 
   CoreSession session(model, track.header);
   for (std::size_t f = 0; f <= chosen; ++f) session.Process(track.frames[f]);
   for (std::size_t k = 0; k < options.settle; ++k) session.Process(track.frames[chosen]);
-  CameraPicture image = Formats().at(options.format)(photo);
+  CameraImage image = Formats().at(options.format)(photo);
   for (const std::size_t face : session.FarToNear()) {
-    CameraPicture mask = CameraPicture::ClearBgra32(image.width(), image.height());
+    CameraImage mask = CameraImage::ClearBgra32(image.width(), image.height());
     session.Warp(texture.Descriptor(), face, mask.Descriptor());
     session.Blend(mask.Descriptor(), image.Descriptor());
   }
-  WritePicture(options.out, format, image.ToPicture(photo.width, photo.height));
+  WriteImage(options.out, format, image.ToImage(photo.width, photo.height));
   std::printf("%s: %zu %s\n", options.out.c_str(), session.faces(),
               session.faces() == 1 ? "face" : "faces");
 }
@@ -88,20 +88,20 @@ void RunMaskCommand(const MaskOptions& options) {
 void AddMaskCommand(CLI::App& app) {
   CLI::App* command = app.add_subcommand(
       "mask",
-      "Puts a mask picture on the faces of a photo with the library's own image functions, which\n"
+      "Puts a mask image on the faces of a photo with the library's own image functions, which\n"
       "need no graphics system.");
   const auto options = std::make_shared<MaskOptions>();
   AddFileArgument(*command, "PHOTO", options->photo,
                   "PNG or JPEG as delivered, of the track's size");
   AddTrackArgument(*command, options->track);
   AddFileOption(*command, "--texture", options->texture,
-                "Mask picture, PNG or JPEG, in the layout of data/face_template.png")
+                "Mask image, PNG or JPEG, in the layout of data/face_template.png")
       ->required();
   AddFileOption(*command, "--out", options->out,
-                "The upright picture with the masks, FILE.png or FILE.jpg")
+                "The upright image with the masks, FILE.png or FILE.jpg")
       ->required();
   AddChoice(*command, "--format", options->format,
-            "Pixel format in which the picture is blended: bgr24 (3 bytes a pixel) or nv21\n"
+            "Pixel format in which the image is blended: bgr24 (3 bytes a pixel) or nv21\n"
             "(a luma and a chroma plane)",
             Formats(), "bgr24|nv21")
       ->capture_default_str();

@@ -28,7 +28,7 @@ void RunModelRender(const RenderOptions& options) {
       FormatOf("--out", options.out, {OutputFormat::kPng, OutputFormat::kJpeg});
   CheckIsNoInput(options.out, {options.face.model});
   const Points face = options.face.face();
-  WritePicture(options.out, format, DrawTurntable(face, options.views, options.size));
+  WriteImage(options.out, format, DrawTurntable(face, options.views, options.size));
   std::printf("%s\n", options.out.c_str());
 }
 
@@ -36,10 +36,10 @@ void RunModelRender(const RenderOptions& options) {
 
 void AddModelRenderCommand(CLI::App& model) {
   CLI::App* command = model.add_subcommand(
-      "render", "Draws a face of the model, lit, from several sides in one picture.");
+      "render", "Draws a face of the model, lit, from several sides in one image.");
   const auto options = std::make_shared<RenderOptions>();
   AddFaceOptions(*command, options->face);
-  AddFileOption(*command, "--out", options->out, "Picture to write, FILE.png or FILE.jpg")
+  AddFileOption(*command, "--out", options->out, "Image to write, FILE.png or FILE.jpg")
       ->required();
   command
       ->add_option("--views", options->views,

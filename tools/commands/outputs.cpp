@@ -61,11 +61,11 @@ OutputFormat FormatOf(const std::string& option, const std::string& path,
                    " (known: " + list + ")");
 }
 
-void WritePicture(const std::string& path, OutputFormat format, const Picture& picture) {
+void WriteImage(const std::string& path, OutputFormat format, const Image& image) {
   if (format == OutputFormat::kJpeg) {
-    WriteJpeg(path, picture);
+    WriteJpeg(path, image);
   } else {
-    WritePng(path, picture);
+    WritePng(path, image);
   }
 }
 

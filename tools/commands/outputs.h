@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "render/picture.h"
+#include "render/image.h"
 
 namespace n3ds::tool {
 
@@ -18,7 +18,7 @@ OutputFormat FormatOf(const std::string& option, const std::string& path,
                       const std::vector<OutputFormat>& known);
 
 // Writes a PNG or a JPEG, whole or not at all. Throws Error.
-void WritePicture(const std::string& path, OutputFormat format, const Picture& picture);
+void WriteImage(const std::string& path, OutputFormat format, const Image& image);
 
 // Whether a path leads to where standard output goes.
 bool IsStandardOutput(const std::string& path);

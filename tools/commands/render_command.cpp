@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// n3ds render: pictures and films of stickers on the tracked faces.
+// n3ds render: images and films of stickers on the tracked faces.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
@@ -21,7 +21,7 @@
 #include "commands/outputs.h"
 #include "engine/engine_session.h"
 #include "render/contact_sheet.h"
-#include "render/picture.h"
+#include "render/image.h"
 #include "render/scene.h"
 #include "render/video_writer.h"
 #include "render/view.h"
@@ -31,7 +31,7 @@
 namespace n3ds::tool {
 namespace {
 
-constexpr int kDefaultSide = 1280;  // largest side of a picture or film when no size is asked for
+constexpr int kDefaultSide = 1280;  // largest side of an image or film when no size is asked for
 constexpr int kDefaultTile = 320;   // of a tile on a contact sheet
 
 struct RenderOptions {
@@ -48,7 +48,7 @@ struct RenderOptions {
   bool closeup = false;
 };
 
-bool IsPicture(OutputFormat format) {
+bool IsImage(OutputFormat format) {
   return format == OutputFormat::kPng || format == OutputFormat::kJpeg;
 }
 
@@ -98,14 +98,14 @@ void CheckMode(const RenderOptions& options, const SceneParts& parts) {
   }
 }
 
-std::optional<Picture> LoadBackground(const RenderOptions& options, const TrackHeader& header) {
+std::optional<Image> LoadBackground(const RenderOptions& options, const TrackHeader& header) {
   if (options.image.empty()) return std::nullopt;
-  const Picture delivered = ReadPicture(options.image);
-  // A reduced or enlarged copy of the picture serves as well, other proportions do not.
+  const Image delivered = ReadImage(options.image);
+  // A reduced or enlarged copy of the image serves as well, other proportions do not.
   const double stretch = static_cast<double>(delivered.width) * header.height /
                          (static_cast<double>(delivered.height) * header.width);
   if (std::abs(stretch - 1) > 0.01) {
-    throw Error(options.image + ": the picture has " + std::to_string(delivered.width) + " x " +
+    throw Error(options.image + ": the image has " + std::to_string(delivered.width) + " x " +
                 std::to_string(delivered.height) + " pixels, the track " +
                 std::to_string(header.width) + " x " + std::to_string(header.height));
   }
@@ -116,7 +116,7 @@ std::optional<Picture> LoadBackground(const RenderOptions& options, const TrackH
 std::vector<std::size_t> ChooseFrames(const Track& track, const RenderOptions& options,
                                       OutputFormat format) {
   if (options.contact_sheet > 0) return EvenlySpaced(track.frames.size(), options.contact_sheet);
-  if (IsPicture(format)) return {ChosenFrame(track, options.track, options.frame)};
+  if (IsImage(format)) return {ChosenFrame(track, options.track, options.frame)};
   std::vector<std::size_t> chosen;
   for (std::size_t f = 0; f < track.frames.size(); f += options.every) chosen.push_back(f);
   return chosen;
@@ -141,8 +141,8 @@ class Drawing {
     view_ =
         options.closeup ? CloseView(track, chosen_, box, side) : WholeView(track.header, box, side);
     if (format == OutputFormat::kFilm) view_.MakeEven();
-    std::optional<Picture> mask;
-    if (!options.texture.empty()) mask = ReadPicture(options.texture);
+    std::optional<Image> mask;
+    if (!options.texture.empty()) mask = ReadImage(options.texture);
     scene_ =
         std::make_unique<Scene>(track.header, model_, parts, LoadBackground(options, track.header),
                                 view_.whole.width, view_.whole.height, mask);
@@ -152,22 +152,21 @@ class Drawing {
     if (format_ == OutputFormat::kFilm) {
       VideoWriter film(options_.out, view_.shown.width, view_.shown.height,
                        track_.header.fps / static_cast<double>(options_.every));
-      DrawFrames([&](const FrameResult&, const Picture& picture) { film.Add(picture); });
+      DrawFrames([&](const FrameResult&, const Image& image) { film.Add(image); });
       film.Finish();
     } else if (options_.contact_sheet > 0) {
       ContactSheet sheet(chosen_.size(), view_.shown.width, view_.shown.height);
-      DrawFrames([&](const FrameResult& result, const Picture& picture) {
-        sheet.Add(picture, result.number);
-      });
-      WritePicture(options_.out, format_, sheet.picture());
-    } else if (IsPicture(format_)) {
-      DrawFrames([&](const FrameResult&, const Picture& picture) {
-        WritePicture(options_.out, format_, picture);
+      DrawFrames(
+          [&](const FrameResult& result, const Image& image) { sheet.Add(image, result.number); });
+      WriteImage(options_.out, format_, sheet.image());
+    } else if (IsImage(format_)) {
+      DrawFrames([&](const FrameResult&, const Image& image) {
+        WriteImage(options_.out, format_, image);
       });
     } else {
       FrameFolder folder(options_.out, Inputs(options_, model_));
-      DrawFrames([&](const FrameResult& result, const Picture& picture) {
-        WritePng(folder.File(result.number, ".png"), picture);
+      DrawFrames([&](const FrameResult& result, const Image& image) {
+        WritePng(folder.File(result.number, ".png"), image);
       });
       folder.Commit();
     }
@@ -175,7 +174,7 @@ class Drawing {
 
  private:
   // Runs the whole track, because tracking is a sequence in time, and draws the chosen frames.
-  void DrawFrames(const std::function<void(const FrameResult&, const Picture&)>& use) {
+  void DrawFrames(const std::function<void(const FrameResult&, const Image&)>& use) {
     EngineSession session(model_, track_.header, options_.engine.mode());
     Progress progress("drawing " + track_.name, chosen_.size());
     std::size_t next = 0;
@@ -206,9 +205,8 @@ void RunRenderCommand(const RenderOptions& options) {
       {OutputFormat::kPng, OutputFormat::kJpeg, OutputFormat::kFilm, OutputFormat::kFolder});
   ParseSize(options.size);
   const bool sheet = options.contact_sheet > 0;
-  if (!IsPicture(format) && (sheet || options.frame)) {
-    throw UsageError(
-        "--frame and --contact-sheet make one picture: --out must end in .png or .jpg");
+  if (!IsImage(format) && (sheet || options.frame)) {
+    throw UsageError("--frame and --contact-sheet make one image: --out must end in .png or .jpg");
   }
   if (sheet && options.frame) throw UsageError("--frame and --contact-sheet exclude each other");
   const std::string model = options.engine.model_path();
@@ -224,26 +222,26 @@ void AddRenderCommand(CLI::App& app) {
   CLI::App* command = app.add_subcommand(
       "render",
       "Draws a hat and glasses on the faces of a track, placed by the engine's matrices alone; in\n"
-      "mask mode the face's dense mesh, plain or under a mask picture.");
+      "mask mode the face's dense mesh, plain or under a mask image.");
   const auto options = std::make_shared<RenderOptions>();
   AddTrackArgument(*command, options->track);
   AddFileOption(*command, "--out", options->out,
-                "FILE.png or FILE.jpg for one picture, FILE.mp4 for a film; a name without an\n"
+                "FILE.png or FILE.jpg for one image, FILE.mp4 for a film; a name without an\n"
                 "ending is a folder that gets a PNG a frame",
                 "PATH")
       ->required();
   AddFileOption(*command, "--image", options->image,
                 "PNG or JPEG drawn behind, as delivered (it is turned like the landmarks)");
-  AddFrameOption(*command, options->frame, "Number of the frame in a picture");
+  AddFrameOption(*command, options->frame, "Number of the frame in an image");
   command
       ->add_option("--contact-sheet", options->contact_sheet,
-                   "Grid of N evenly spaced frames in one picture (12)")
+                   "Grid of N evenly spaced frames in one image (12)")
       ->type_name("N")
       ->expected(0, 1)
       ->default_str("12")
       ->check(CLI::Range(1, 400).description(""));
   AddEveryOption(*command, options->every, "Draw every Nth frame of a film or folder");
-  command->add_option("--size", options->size, "Box into which a picture, film or tile is fitted")
+  command->add_option("--size", options->size, "Box into which an image, film or tile is fitted")
       ->type_name("WIDTHxHEIGHT");
   command->add_flag("--closeup", options->closeup, "Show the heads alone");
   AddChoice(
@@ -259,7 +257,7 @@ void AddRenderCommand(CLI::App& app) {
                 "data/face_template.png");
   AddEngineOptions(*command, options->engine);
   command->footer(
-      "The output shows the upright, unmirrored picture, whatever the orientation of the track.\n"
+      "The output shows the upright, unmirrored image, whatever the orientation of the track.\n"
       "The mean head of the model hides what lies behind it. Without --frame or --contact-sheet,\n"
       "FILE.png shows the first frame with a face. Films need the program ffmpeg.\n"
       "Examples:\n"

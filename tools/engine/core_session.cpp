@@ -159,7 +159,7 @@ void CoreSession::Warp(const NSVL_OFFSCREEN& texture, std::size_t face, NSVL_OFF
 
 void CoreSession::Blend(NSVL_OFFSCREEN mask, NSVL_OFFSCREEN image) {
   Check(N3DS_BlendFaceMask(core_, &image, &mask, &image),
-        "the mask cannot be blended into the picture");
+        "the mask cannot be blended into the image");
 }
 
 }  // namespace n3ds::tool

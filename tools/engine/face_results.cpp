@@ -65,8 +65,8 @@ bool IsFinite(const FaceResult& face) {
          IsFinite(face.corners);
 }
 
-PixelPoint ProjectToPicture(const FaceResult& face, const TrackHeader& header, double x, double y,
-                            double z) {
+PixelPoint ProjectToImage(const FaceResult& face, const TrackHeader& header, double x, double y,
+                          double z) {
   const Vector3 eye = Transformed(ModelView(face), {x, y, z});
   std::array<double, 4> clip{};
   for (std::size_t row = 0; row < 4; ++row) {
@@ -79,7 +79,7 @@ PixelPoint ProjectToPicture(const FaceResult& face, const TrackHeader& header, d
 
 PixelPoint ProjectToPixel(const FaceResult& face, const TrackHeader& header, double x, double y,
                           double z) {
-  const PixelPoint place = ProjectToPicture(face, header, x, y, z);
+  const PixelPoint place = ProjectToImage(face, header, x, y, z);
   return {place.x - 0.5, place.y - 0.5};
 }
 

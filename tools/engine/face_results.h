@@ -49,16 +49,16 @@ bool IsFinite(const FaceResult& face);
 bool IsFinite(const std::vector<float>& values);
 
 // The engine's matrices are made for a viewport of even size; an odd last row or column of the
-// picture lies outside of it.
-inline int ViewportSize(int picture_size) { return picture_size - picture_size % 2; }
+// image lies outside of it.
+inline int ViewportSize(int image_size) { return image_size - image_size % 2; }
 
-// Where the matrices put a point of the model frame in the upright picture, which reaches from 0 to
+// Where the matrices put a point of the model frame in the upright image, which reaches from 0 to
 // its width and height. The engine's fits take the landmarks' numbers for such places.
-PixelPoint ProjectToPicture(const FaceResult& face, const TrackHeader& header, double x, double y,
-                            double z);
+PixelPoint ProjectToImage(const FaceResult& face, const TrackHeader& header, double x, double y,
+                          double z);
 
 // Where a renderer that uses nothing but the three matrices puts a point of the model frame, in
-// pixels of the upright picture as the landmarks count them: landmark x stands for the centre of
+// pixels of the upright image as the landmarks count them: landmark x stands for the centre of
 // pixel column x, so half a pixel is taken off.
 PixelPoint ProjectToPixel(const FaceResult& face, const TrackHeader& header, double x, double y,
                           double z);

@@ -23,7 +23,7 @@ void MeanFit::AddDistances(const TrackHeader& header, const TrackFace& face,
   head.pitched = false;
   for (std::size_t k = kFirstInnerLandmark; k <= kLastInnerLandmark; ++k) {
     const Vector3& v = mean_[LandmarkVertices()[k]];
-    const PixelPoint drawn = ProjectToPicture(head, header, v[0], v[1], v[2]);
+    const PixelPoint drawn = ProjectToImage(head, header, v[0], v[1], v[2]);
     distances.push_back(100 * std::hypot(drawn.x - seen[k].x, drawn.y - seen[k].y) / pupils);
   }
 }

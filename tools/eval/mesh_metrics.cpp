@@ -23,7 +23,7 @@ double Distance(const PixelPoint& a, const PixelPoint& b) {
   return std::hypot(a.x - b.x, a.y - b.y);
 }
 
-// Where a landmark of a truth with 3-D points appears in the upright picture.
+// Where a landmark of a truth with 3-D points appears in the upright image.
 PixelPoint TruePlace(const TrackHeader& header, const TrackTruth& truth, std::size_t landmark) {
   const double* p = &truth.points3d[3 * landmark];
   return {*header.focal * p[0] / p[2] + header.upright_width() / 2.0,
@@ -112,7 +112,7 @@ void MeshJudge::AddDistances(const TrackHeader& header, const TrackFace& face,
   if (pupils == 0) return;
   const auto drawn = [&](std::size_t landmark) {
     const Vector3& v = vertices[LandmarkVertices()[landmark]];
-    return ProjectToPicture(result, header, v[0], v[1], v[2]);
+    return ProjectToImage(result, header, v[0], v[1], v[2]);
   };
   const bool is_known = face.truth && !face.truth->points3d.empty() && header.focal;
   for (std::size_t k = kFirstInnerLandmark; k <= kLastInnerLandmark; ++k) {

@@ -20,10 +20,10 @@ constexpr double kMeshYaw = 40;  // degrees, without sign
 // Between the pupils of a face, in pixels: the unit of the distances.
 double PupilDistance(const std::vector<PixelPoint>& landmarks);
 
-// Lengths are in percent of the interpupillary distance in the same picture.
+// Lengths are in percent of the interpupillary distance in the same image.
 struct MeshScore {
   std::size_t faces = 0;          // with a finite pose and mesh, at any yaw
-  std::size_t not_finite = 0;     // faces with a number that is none
+  std::size_t not_finite = 0;     // faces with a NaN or infinite value
   std::size_t folded = 0;         // faces with a fold
   std::vector<double> distances;  // landmark to its vertex, inner landmarks, yaw within kMeshYaw
   // The same from where the landmarks truly are, in the faces whose truth tells it: without the

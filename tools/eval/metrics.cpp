@@ -52,7 +52,7 @@ Matrix3 RotationError(const Sample& sample, const HeadFrameOffset& offset) {
                     sample.pose.rotation);
 }
 
-// Where the estimate misses, as an offset parallel to the picture at the true depth: the difference
+// Where the estimate misses, as an offset parallel to the image at the true depth: the difference
 // of the two viewing directions times that depth.
 struct OriginError {
   double x = 0;

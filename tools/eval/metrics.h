@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: MIT
 // How far estimated head poses are from the true ones of a track.
 //
-// Poses take a head frame to the camera frame of the upright picture (x right, y down, z forward,
+// Poses take a head frame to the camera frame of the upright image (x right, y down, z forward,
 // mm). The estimator's head frame and the track's differ by a constant, because each defines
 // "facing forward" and the origin in its own way: one rotation and one origin are estimated over
 // all tracks together and taken off before anything is compared.
 //
-// The distance to a head cannot be told from the picture without the focal length. An estimator
+// The distance to a head cannot be told from the image without the focal length. An estimator
 // that assumes f where the truth has F finds distances too small by f / F; they are scaled before
 // they are compared. What remains in depth is mostly the size of the person's head.
 #pragma once
@@ -56,7 +56,7 @@ constexpr double kRestMillimetresPerSecond = 60;
 struct PoseError {
   double yaw = 0;       // of the true head, degrees, without sign
   double rotation = 0;  // degrees
-  double across = 0;    // of the origin, parallel to the picture, mm at the true depth
+  double across = 0;    // of the origin, parallel to the image, mm at the true depth
   double depth = 0;     // percent of the true depth, without sign
 };
 
@@ -85,7 +85,7 @@ PoseEstimate CameraPose(const FaceResult& face);
 TrackPoses CameraPoses(const Track& track, const std::vector<FrameResult>& results);
 // How far a head is turned to the side, in degrees without sign.
 double AbsoluteYaw(const Matrix3& rotation);
-// The focal length that the engine assumes for a picture.
+// The focal length that the engine assumes for an image.
 double EngineFocal(const TrackHeader& header);
 
 HeadFrameOffset EstimateOffset(const std::vector<JudgedTrack>& tracks);

@@ -68,7 +68,7 @@ const char kScoreTableLegend[] =
     "           15 % of the depth\n"
     "rotN, p95  rotation error in degrees, median and 95th percentile, of the heads turned by at\n"
     "           most N degrees, after one constant offset between the head frames\n"
-    "across     offset of the head's origin parallel to the picture, mm\n"
+    "across     offset of the head's origin parallel to the image, mm\n"
     "depth      error of the distance in percent, for the true focal length\n"
     "jit        root mean square of the error's change between frames, in degrees and mm, while\n"
     "           the head turns by less than 15 degrees and moves by less than 60 mm a second\n"
@@ -76,7 +76,7 @@ const char kScoreTableLegend[] =
 
 const char kMeshColumnsLegend[] =
     "mesh       distance of the inner landmarks to their vertices of the dense mesh in the\n"
-    "           picture, percent of the interpupillary distance, median and 95th percentile\n"
+    "           image, percent of the interpupillary distance, median and 95th percentile\n"
     "           over the heads turned by at most 40 degrees\n"
     "true       the same from where the landmarks truly are, in the frames that tell it\n"
     "broken     faces with a mesh that is not finite\n"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// How the triangles of a mesh hang together.
+// Connectivity of a mesh.
 #pragma once
 
 #include <array>

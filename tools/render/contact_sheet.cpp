@@ -27,16 +27,16 @@ constexpr const char* kDigits[10][kGlyphHeight] = {
     {".###.", "#...#", "#...#", ".####", "....#", "...#.", ".##.."},
 };
 
-void FillBlock(Picture& picture, int x, int y, int size, std::uint8_t grey) {
-  for (int row = std::max(y, 0); row < std::min(y + size, picture.height); ++row) {
-    for (int column = std::max(x, 0); column < std::min(x + size, picture.width); ++column) {
-      std::fill_n(picture.Pixel(column, row), 3, grey);
+void FillBlock(Image& image, int x, int y, int size, std::uint8_t grey) {
+  for (int row = std::max(y, 0); row < std::min(y + size, image.height); ++row) {
+    for (int column = std::max(x, 0); column < std::min(x + size, image.width); ++column) {
+      std::fill_n(image.Pixel(column, row), 3, grey);
     }
   }
 }
 
 // White digits with a dark edge, readable on any ground. (x, y) is the upper left corner.
-void DrawNumber(Picture& picture, std::int64_t number, int x, int y, int dot) {
+void DrawNumber(Image& image, std::int64_t number, int x, int y, int dot) {
   const std::string text = std::to_string(number);
   for (const bool edge : {true, false}) {
     int left = x;
@@ -45,7 +45,7 @@ void DrawNumber(Picture& picture, std::int64_t number, int x, int y, int dot) {
         for (int column = 0; column < kGlyphWidth; ++column) {
           if (kDigits[digit - '0'][row][column] != '#') continue;
           const int grow = edge ? 1 : 0;
-          FillBlock(picture, left + column * dot - grow, y + row * dot - grow, dot + 2 * grow,
+          FillBlock(image, left + column * dot - grow, y + row * dot - grow, dot + 2 * grow,
                     edge ? 20 : 255);
         }
       }
@@ -89,15 +89,15 @@ ContactSheet::ContactSheet(std::size_t tiles, int tile_width, int tile_height)
       tile_width_(tile_width),
       tile_height_(tile_height) {
   const int rows = (static_cast<int>(tiles) + columns_ - 1) / columns_;
-  picture_ = Picture(columns_ * (tile_width + kGap) - kGap, rows * (tile_height + kGap) - kGap);
+  image_ = Image(columns_ * (tile_width + kGap) - kGap, rows * (tile_height + kGap) - kGap);
 }
 
-void ContactSheet::Add(const Picture& tile, std::int64_t frame_number) {
-  Picture labelled = tile;
+void ContactSheet::Add(const Image& tile, std::int64_t frame_number) {
+  Image labelled = tile;
   constexpr int kDot = 2;
   DrawNumber(labelled, frame_number, 6, tile_height_ - kGlyphHeight * kDot - 6, kDot);
   Paste(labelled, added_ % columns_ * (tile_width_ + kGap),
-        added_ / columns_ * (tile_height_ + kGap), picture_);
+        added_ / columns_ * (tile_height_ + kGap), image_);
   ++added_;
 }
 

@@ -40,7 +40,7 @@ class LineReader {
 
 std::array<float, 3> ReadTriple(const LineReader& reader, std::istringstream& words) {
   std::array<float, 3> triple{};
-  if (!(words >> triple[0] >> triple[1] >> triple[2])) reader.Fail("three numbers are needed");
+  if (!(words >> triple[0] >> triple[1] >> triple[2])) reader.Fail("expected three numbers");
   return triple;
 }
 
@@ -64,7 +64,7 @@ std::map<std::string, Material> ReadMaterials(const std::string& path) {
       current->colour = ReadTriple(reader, words);
     } else {
       float value = 0;
-      if (!(words >> value)) reader.Fail("a number is needed");
+      if (!(words >> value)) reader.Fail("expected a number");
       if (keyword == "d") {
         current->opacity = value;
       } else {
@@ -104,7 +104,7 @@ class ObjBuilder {
     if (known != index_.end()) return known->second;
     const std::size_t last_slash = corner.rfind('/');
     if (last_slash == std::string::npos || corner.find('/') == last_slash) {
-      reader.Fail("corner " + corner + " has no normal (v//vn is needed)");
+      reader.Fail("corner " + corner + " has no normal (expected v//vn)");
     }
     Vertex vertex;
     vertex.position = Entry(reader, positions, corner.substr(0, corner.find('/')));
@@ -157,7 +157,7 @@ Mesh ReadObj(const std::string& path) {
       builder.StartPart(found->second);
     }
   }
-  if (builder.mesh.indices.empty()) throw Error(path + ": there is no face in it");
+  if (builder.mesh.indices.empty()) throw Error(path + ": file contains no faces");
   return std::move(builder.mesh);
 }
 

@@ -31,7 +31,7 @@ RenderTarget::RenderTarget(int width, int height) : width_(width), height_(heigh
   attach(0, GL_COLOR_ATTACHMENT0, 0);
   attach(0, GL_DEPTH_ATTACHMENT, 1);
   if (glCheckFramebufferStatus(GL_FRAMEBUFFER) != GL_FRAMEBUFFER_COMPLETE) {
-    throw Error("a picture of " + std::to_string(width) + " x " + std::to_string(height) +
+    throw Error("an image of " + std::to_string(width) + " x " + std::to_string(height) +
                 " pixels cannot be drawn here");
   }
 }
@@ -43,21 +43,21 @@ RenderTarget::~RenderTarget() {
 
 void RenderTarget::Bind() const { glBindFramebuffer(GL_FRAMEBUFFER, framebuffers_[0]); }
 
-Picture RenderTarget::Read() const {
+Image RenderTarget::Read() const {
   glBindFramebuffer(GL_READ_FRAMEBUFFER, framebuffers_[0]);
   glBindFramebuffer(GL_DRAW_FRAMEBUFFER, framebuffers_[1]);
   glBlitFramebuffer(0, 0, width_, height_, 0, 0, width_, height_, GL_COLOR_BUFFER_BIT, GL_NEAREST);
   glBindFramebuffer(GL_READ_FRAMEBUFFER, framebuffers_[1]);
-  Picture picture(width_, height_);
-  glReadPixels(0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE, picture.rgba.data());
+  Image image(width_, height_);
+  glReadPixels(0, 0, width_, height_, GL_RGBA, GL_UNSIGNED_BYTE, image.rgba.data());
   Bind();
   // OpenGL's first row is the lowest.
   const std::size_t row = 4 * static_cast<std::size_t>(width_);
   for (int y = 0; y < height_ / 2; ++y) {
-    std::uint8_t* upper = picture.Pixel(0, y);
-    std::swap_ranges(upper, upper + row, picture.Pixel(0, height_ - 1 - y));
+    std::uint8_t* upper = image.Pixel(0, y);
+    std::swap_ranges(upper, upper + row, image.Pixel(0, height_ - 1 - y));
   }
-  return picture;
+  return image;
 }
 
 }  // namespace n3ds::tool

@@ -1,16 +1,16 @@
 // SPDX-License-Identifier: MIT
-// A picture to draw into, several samples a pixel for smooth edges.
+// An image to draw into, several samples a pixel for smooth edges.
 #pragma once
 
 #include <GLES3/gl3.h>
 
-#include "render/picture.h"
+#include "render/image.h"
 
 namespace n3ds::tool {
 
 class RenderTarget {
  public:
-  // Throws Error when the graphics system cannot provide a picture of this size.
+  // Throws Error when the graphics system cannot provide an image of this size.
   RenderTarget(int width, int height);
   ~RenderTarget();
   RenderTarget(const RenderTarget&) = delete;
@@ -20,7 +20,7 @@ class RenderTarget {
   int height() const { return height_; }
   void Bind() const;
   // What has been drawn, rows from the top.
-  Picture Read() const;
+  Image Read() const;
 
  private:
   int width_;

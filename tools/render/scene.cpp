@@ -22,12 +22,12 @@ void SetMatrices(const GlProgram& program, const FaceResult& face, const Matrix4
   glUniformMatrix4fv(program.Uniform("model"), 1, GL_FALSE, model.data());
 }
 
-GLuint UploadTexture(const Picture& picture) {
+GLuint UploadTexture(const Image& image) {
   GLuint texture = 0;
   glGenTextures(1, &texture);
   glBindTexture(GL_TEXTURE_2D, texture);
-  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA8, picture.width, picture.height, 0, GL_RGBA,
-               GL_UNSIGNED_BYTE, picture.rgba.data());
+  glTexImage2D(GL_TEXTURE_2D, 0, GL_RGBA8, image.width, image.height, 0, GL_RGBA, GL_UNSIGNED_BYTE,
+               image.rgba.data());
   // Photos are often larger than what is drawn: without smaller copies they would flicker.
   glGenerateMipmap(GL_TEXTURE_2D);
   glTexParameteri(GL_TEXTURE_2D, GL_TEXTURE_MIN_FILTER, GL_LINEAR_MIPMAP_LINEAR);
@@ -37,21 +37,21 @@ GLuint UploadTexture(const Picture& picture) {
   return texture;
 }
 
-Picture Premultiplied(Picture picture) {
-  for (std::size_t i = 0; i < picture.rgba.size(); i += 4) {
+Image Premultiplied(Image image) {
+  for (std::size_t i = 0; i < image.rgba.size(); i += 4) {
     for (std::size_t k = 0; k < 3; ++k) {
-      picture.rgba[i + k] =
-          static_cast<std::uint8_t>((picture.rgba[i + k] * picture.rgba[i + 3] + 127) / 255);
+      image.rgba[i + k] =
+          static_cast<std::uint8_t>((image.rgba[i + k] * image.rgba[i + 3] + 127) / 255);
     }
   }
-  return picture;
+  return image;
 }
 
 }  // namespace
 
 Scene::Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
-             const std::optional<Picture>& background, int width, int height,
-             const std::optional<Picture>& mask)
+             const std::optional<Image>& background, int width, int height,
+             const std::optional<Image>& mask)
     : header_(header),
       parts_(parts),
       target_(width, height),
@@ -69,17 +69,17 @@ Scene::Scene(const TrackHeader& header, const std::string& model_path, const Sce
   glGenVertexArrays(1, &dot_array_);
   glGenBuffers(1, &dot_buffer_);
   if (background) background_ = UploadTexture(*background);
-  if (mask) mask_picture_ = UploadTexture(Premultiplied(*mask));
+  if (mask) mask_image_ = UploadTexture(Premultiplied(*mask));
 }
 
 Scene::~Scene() {
-  glDeleteTextures(1, &mask_picture_);
+  glDeleteTextures(1, &mask_image_);
   glDeleteTextures(1, &background_);
   glDeleteBuffers(1, &dot_buffer_);
   glDeleteVertexArrays(1, &dot_array_);
 }
 
-Picture Scene::Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates) {
+Image Scene::Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates) {
   target_.Bind();
   glViewport(0, 0, target_.width(), target_.height());
   glClear(GL_DEPTH_BUFFER_BIT);
@@ -109,7 +109,7 @@ Picture Scene::Draw(const FrameResult& frame, const std::vector<float>& texture_
   glDepthMask(GL_FALSE);
   for (std::size_t i = 0; i < faces.size(); ++i) {
     if (faces[i]->corners.empty()) continue;
-    if (mask_picture_ != 0) DrawMask(*faces[i], meshes_[i]);
+    if (mask_image_ != 0) DrawMask(*faces[i], meshes_[i]);
     if (parts_.wireframe) DrawWireframe(*faces[i], meshes_[i]);
   }
   glBlendFuncSeparate(GL_SRC_ALPHA, GL_ONE_MINUS_SRC_ALPHA, GL_ZERO, GL_ONE);
@@ -126,8 +126,8 @@ Picture Scene::Draw(const FrameResult& frame, const std::vector<float>& texture_
 void Scene::DrawBackground() const {
   ground_.Use();
   glBindTexture(GL_TEXTURE_2D, background_);
-  glUniform1i(ground_.Uniform("has_picture"), background_ != 0 ? 1 : 0);
-  glUniform1i(ground_.Uniform("picture"), 0);
+  glUniform1i(ground_.Uniform("has_image"), background_ != 0 ? 1 : 0);
+  glUniform1i(ground_.Uniform("image"), 0);
   glBindVertexArray(dot_array_);
   glDrawArrays(GL_TRIANGLES, 0, 3);
 }
@@ -137,7 +137,7 @@ void Scene::DrawHead(const FaceResult& face, const MaskMesh& mesh) const {
     const GLboolean mask = seen ? GL_TRUE : GL_FALSE;
     glColorMask(mask, mask, mask, GL_FALSE);
   };
-  // A hair's breadth back, so that what is drawn on the very same surface lies before it.
+  // Slightly back, so that what is drawn on the very same surface lies before it.
   glEnable(GL_POLYGON_OFFSET_FILL);
   glPolygonOffset(1, 1);
   if (face.corners.empty()) {
@@ -157,8 +157,8 @@ void Scene::DrawHead(const FaceResult& face, const MaskMesh& mesh) const {
 
 void Scene::DrawMask(const FaceResult& face, const MaskMesh& mesh) const {
   SetMatrices(mask_, face, face.model);
-  glUniform1i(mask_.Uniform("picture"), 0);
-  glBindTexture(GL_TEXTURE_2D, mask_picture_);
+  glUniform1i(mask_.Uniform("image"), 0);
+  glBindTexture(GL_TEXTURE_2D, mask_image_);
   // Paint on the skin has no inside.
   glEnable(GL_CULL_FACE);
   mesh.Draw();

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: MIT
-// Draws what a user of stickers sees: a picture or a plain ground, and on every face a hat and a
+// Draws what a user of stickers sees: an image or a plain ground, and on every face a hat and a
 // pair of glasses, placed by nothing but the engine's three matrices, or its dense mesh, lit, as
-// wireframe or under a mask picture.
+// wireframe or under a mask image.
 //
-// Everything is drawn in the upright, unmirrored picture.
+// Everything is drawn in the upright, unmirrored image.
 #pragma once
 
 #include <array>
@@ -15,8 +15,8 @@
 #include "render/egl_context.h"
 #include "render/gl_program.h"
 #include "render/gpu_mesh.h"
+#include "render/image.h"
 #include "render/mask_mesh.h"
-#include "render/picture.h"
 #include "render/render_target.h"
 #include "tracks/track_file.h"
 
@@ -38,13 +38,13 @@ class Scene {
   // meshes of mask mode. Throws Error when the model or an asset cannot be read or the graphics
   // system refuses.
   Scene(const TrackHeader& header, const std::string& model_path, const SceneParts& parts,
-        const std::optional<Picture>& background, int width, int height,
-        const std::optional<Picture>& mask = std::nullopt);
+        const std::optional<Image>& background, int width, int height,
+        const std::optional<Image>& mask = std::nullopt);
   ~Scene();
 
   // The result stays valid on its own. Faces without a finite pose are left out. Meshes need the
   // engine's texture coordinates, u, v per corner.
-  Picture Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates = {});
+  Image Draw(const FrameResult& frame, const std::vector<float>& texture_coordinates = {});
 
  private:
   void DrawBackground() const;
@@ -73,8 +73,8 @@ class Scene {
   GpuMesh tripod_;
   GLuint dot_array_ = 0;
   GLuint dot_buffer_ = 0;
-  GLuint background_ = 0;    // texture, 0 without
-  GLuint mask_picture_ = 0;  // the same
+  GLuint background_ = 0;  // texture, 0 without
+  GLuint mask_image_ = 0;  // the same
   std::array<MaskMesh, kMaxTrackFaces> meshes_;
 };
 

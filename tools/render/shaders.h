@@ -77,7 +77,7 @@ void main() {
   result = vec4(0.10, 0.95, 0.55, clamp(0.5 * size - radius, 0.0, 1.0));
 })";
 
-// One triangle over the whole picture; `place` runs from (0, 0) in the upper left corner to (1, 1).
+// One triangle over the whole image; `place` runs from (0, 0) in the upper left corner to (1, 1).
 inline constexpr char kGroundVertex[] = R"(
 out vec2 place;
 void main() {
@@ -88,16 +88,16 @@ void main() {
 
 inline constexpr char kGroundFragment[] = R"(
 in vec2 place;
-uniform bool has_picture;
-uniform sampler2D picture;
+uniform bool has_image;
+uniform sampler2D image;
 out vec4 result;
 void main() {
   float shade = 0.62 - 0.22 * place.y - 0.10 * length(place - 0.5);
-  result = has_picture ? vec4(texture(picture, place).rgb, 1.0)
+  result = has_image ? vec4(texture(image, place).rgb, 1.0)
                        : vec4(vec3(0.92, 0.97, 1.04) * shade, 1.0);
 })";
 
-// The mask picture on the dense mesh. Its colours are multiplied by their alpha beforehand, so that
+// The mask image on the dense mesh. Its colours are multiplied by their alpha beforehand, so that
 // what hides in transparent places does not bleed over the edges.
 inline constexpr char kMaskVertex[] = R"(
 layout(location = 0) in vec3 position;
@@ -117,12 +117,12 @@ void main() {
 inline constexpr char kMaskFragment[] = R"(
 in vec3 eye_normal;
 in vec2 place;
-uniform sampler2D picture;
+uniform sampler2D image;
 out vec4 result;
 void main() {
   vec3 n = normalize(eye_normal);
   float direct = max(dot(n, normalize(vec3(-0.45, 0.75, 0.70))), 0.0);
-  vec4 colour = texture(picture, place);
+  vec4 colour = texture(image, place);
   result = vec4(min(colour.rgb * (0.68 + 0.42 * direct), vec3(colour.a)), colour.a);
 })";
 

@@ -66,12 +66,12 @@ double YawOf(int view, int views) {
 
 }  // namespace
 
-Picture DrawTurntable(const Points& face, int views, int size) {
+Image DrawTurntable(const Points& face, int views, int size) {
   const EglContext context;
   const RenderTarget target(size, size);
   const GlProgram program(kSolidVertex, kStudioFragment);
   const GpuMesh mesh(FaceMesh(face));
-  Picture row(views * size, size);
+  Image row(views * size, size);
   target.Bind();
   glViewport(0, 0, size, size);
   glEnable(GL_DEPTH_TEST);

@@ -101,8 +101,8 @@ bool VideoWriter::Stop() {
   return flushed && WIFEXITED(status) && WEXITSTATUS(status) == 0;
 }
 
-void VideoWriter::Add(const Picture& picture) {
-  if (std::fwrite(picture.rgba.data(), 1, picture.rgba.size(), pipe_) != picture.rgba.size()) {
+void VideoWriter::Add(const Image& image) {
+  if (std::fwrite(image.rgba.data(), 1, image.rgba.size(), pipe_) != image.rgba.size()) {
     throw Error(path_.path() + ": ffmpeg stopped taking frames");
   }
 }

@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <string>
 
-#include "render/picture.h"
+#include "render/image.h"
 #include "support/atomic_file.h"
 
 namespace n3ds::tool {
@@ -20,7 +20,7 @@ class VideoWriter {
   VideoWriter(const VideoWriter&) = delete;
   VideoWriter& operator=(const VideoWriter&) = delete;
 
-  void Add(const Picture& picture);
+  void Add(const Image& image);
   // Ends the film and puts it in its place. Throws Error when the encoder failed.
   void Finish();
 

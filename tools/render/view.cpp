@@ -14,7 +14,7 @@ int Scaled(double size, double scale) {
   return std::clamp(static_cast<int>(std::lround(size * scale)), 1, kLargestDrawnSide);
 }
 
-// In pixels of the upright picture.
+// In pixels of the upright image.
 struct Region {
   double left = std::numeric_limits<double>::max();
   double top = std::numeric_limits<double>::max();
@@ -50,10 +50,10 @@ void View::MakeEven() {
   whole.height = std::max(whole.height, top + shown.height);
 }
 
-Picture View::Cut(const Picture& whole_picture) const {
-  Picture cut(shown.width, shown.height);
+Image View::Cut(const Image& whole_image) const {
+  Image cut(shown.width, shown.height);
   for (int row = 0; row < shown.height; ++row) {
-    std::copy_n(whole_picture.Pixel(left, top + row), 4 * static_cast<std::size_t>(shown.width),
+    std::copy_n(whole_image.Pixel(left, top + row), 4 * static_cast<std::size_t>(shown.width),
                 cut.Pixel(0, row));
   }
   return cut;
@@ -85,7 +85,7 @@ View CloseView(const Track& track, const std::vector<std::size_t>& frames,
   region.bottom = std::min(region.bottom, h);
   const double region_width = region.right - region.left;
   const double region_height = region.bottom - region.top;
-  // No face, or only faces outside of the picture.
+  // No face, or only faces outside of the image.
   if (!(region_width >= 1 && region_height >= 1)) return WholeView(track.header, box, default_side);
 
   const Size room = box.value_or(Size{default_side, default_side});

@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: MIT
-// Which part of the upright picture is drawn, and how large.
+// Which part of the upright image is drawn, and how large.
 #pragma once
 
 #include <cstddef>
 #include <optional>
 #include <vector>
 
-#include "render/picture.h"
+#include "render/image.h"
 #include "tracks/track_file.h"
 
 namespace n3ds::tool {
@@ -19,22 +19,22 @@ struct Size {
 };
 
 struct View {
-  Size whole;  // of the upright picture as it is drawn
+  Size whole;  // of the upright image as it is drawn
   int left = 0;
   int top = 0;
   Size shown;  // of the part that is kept
 
   // Makes the shown size even, as films need it.
   void MakeEven();
-  Picture Cut(const Picture& whole_picture) const;
+  Image Cut(const Image& whole_image) const;
 };
 
-// The whole upright picture, as large as it goes into the box; without a box its own size, reduced
+// The whole upright image, as large as it goes into the box; without a box its own size, reduced
 // to `default_side`.
 View WholeView(const TrackHeader& header, const std::optional<Size>& box, int default_side);
 
 // The heads of the given frames alone, as large as they go into the box (a square of `default_side`
-// without one). The whole picture where there is no face.
+// without one). The whole image where there is no face.
 View CloseView(const Track& track, const std::vector<std::size_t>& frames,
                const std::optional<Size>& box, int default_side);
 

@@ -111,7 +111,7 @@ AtomicPath::AtomicPath(const std::string& path, const std::string& ending)
       temporary_(TemporaryName(target_, ending)),
       unfinished_(temporary_, Unfinished::Kind::kFile) {
   const Target target = FindTarget(path);
-  if (!target.is_regular()) throw Error(path + ": not a regular file, which is needed here");
+  if (!target.is_regular()) throw Error(path + ": expected a regular file");
   MakeTemporary(path, temporary_, target);
 }
 

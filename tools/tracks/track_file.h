@@ -50,12 +50,12 @@ struct TrackFrame {
 };
 
 struct TrackHeader {
-  int width = 0;  // of the picture as delivered
+  int width = 0;  // of the image as delivered
   int height = 0;
   double fps = 0;
   int landmarks = 0;  // N3DS_LANDMARKS_101 or N3DS_LANDMARKS_165
-  int degree = 0;     // 0, 90, 180 or 270, clockwise turn of the delivered picture
-  int mirror = 0;     // 1 for a mirrored picture
+  int degree = 0;     // 0, 90, 180 or 270, clockwise turn of the delivered image
+  int mirror = 0;     // 1 for a mirrored image
   std::string source;
   std::string title;
   std::optional<double> focal;      // true focal length in pixels; needed by truth

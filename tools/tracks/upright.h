@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// From the picture as delivered to the upright, unmirrored frame in which the results are given.
+// From the image as delivered to the upright, unmirrored frame in which the results are given.
 #pragma once
 
 #include <array>
@@ -15,12 +15,12 @@ struct PixelPoint {
   double y = 0;
 };
 
-// A point of the delivered picture in the upright frame. Mirroring and turning use the full width
+// A point of the delivered image in the upright frame. Mirroring and turning use the full width
 // and height: column 0 maps to column W.
 PixelPoint ToUpright(const TrackHeader& header, double x, double y);
 
 // The landmark that takes the place of `landmark` when a face is mirrored (itself on the face's
-// middle line), for a layout of 101 or 165 landmarks.
+// midline), for a layout of 101 or 165 landmarks.
 int MirrorLandmark(int landmark, int landmarks);
 
 // A face's landmarks in the upright frame and numbering.

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-#include "render/camera_picture.h"
+#include "render/camera_image.h"
 
 #include <algorithm>
 #include <cstddef>
@@ -32,46 +32,46 @@ std::uint8_t Component(std::uint32_t word, int index) {
 
 }  // namespace
 
-CameraPicture::CameraPicture(std::uint32_t format, int width, int height)
+CameraImage::CameraImage(std::uint32_t format, int width, int height)
     : format_(format), width_(width), height_(height) {
   pixels_.resize(Offset(0, height));
   if (format == N3DS_FORMAT_NV21) chroma_.resize(ChromaOffset(0, height));
 }
 
-std::size_t CameraPicture::Offset(int x, int y) const {
+std::size_t CameraImage::Offset(int x, int y) const {
   return (static_cast<std::size_t>(y) * static_cast<std::size_t>(width_) +
           static_cast<std::size_t>(x)) *
          static_cast<std::size_t>(BytesAPixel(format_));
 }
 
-std::size_t CameraPicture::ChromaOffset(int x, int y) const {
+std::size_t CameraImage::ChromaOffset(int x, int y) const {
   return static_cast<std::size_t>(y / 2) * static_cast<std::size_t>(width_) +
          static_cast<std::size_t>(x / 2 * 2);
 }
 
-CameraPicture CameraPicture::ClearBgra32(int width, int height) {
+CameraImage CameraImage::ClearBgra32(int width, int height) {
   return {N3DS_FORMAT_BGRA32, width, height};
 }
 
-CameraPicture CameraPicture::Bgr24(const Picture& picture) {
-  CameraPicture result(N3DS_FORMAT_BGR24, picture.width, picture.height);
-  for (std::size_t i = 0; i < picture.rgba.size() / 4; ++i) {
-    for (std::size_t k = 0; k < 3; ++k) result.pixels_[3 * i + k] = picture.rgba[4 * i + 2 - k];
+CameraImage CameraImage::Bgr24(const Image& image) {
+  CameraImage result(N3DS_FORMAT_BGR24, image.width, image.height);
+  for (std::size_t i = 0; i < image.rgba.size() / 4; ++i) {
+    for (std::size_t k = 0; k < 3; ++k) result.pixels_[3 * i + k] = image.rgba[4 * i + 2 - k];
   }
   return result;
 }
 
-CameraPicture CameraPicture::Bgra32(const Picture& picture) {
-  CameraPicture result(N3DS_FORMAT_BGRA32, picture.width, picture.height);
-  result.pixels_ = picture.rgba;
+CameraImage CameraImage::Bgra32(const Image& image) {
+  CameraImage result(N3DS_FORMAT_BGRA32, image.width, image.height);
+  result.pixels_ = image.rgba;
   for (std::size_t i = 0; i < result.pixels_.size(); i += 4) {
     std::swap(result.pixels_[i], result.pixels_[i + 2]);
   }
   return result;
 }
 
-CameraPicture CameraPicture::Nv21(const Picture& picture) {
-  CameraPicture result(N3DS_FORMAT_NV21, NextEven(picture.width), NextEven(picture.height));
+CameraImage CameraImage::Nv21(const Image& image) {
+  CameraImage result(N3DS_FORMAT_NV21, NextEven(image.width), NextEven(image.height));
   for (int y = 0; y < result.height_; y += 2) {
     for (int x = 0; x < result.width_; x += 2) {
       unsigned u = 0;
@@ -80,7 +80,7 @@ CameraPicture CameraPicture::Nv21(const Picture& picture) {
         const int px = x + k % 2;
         const int py = y + k / 2;
         const std::uint8_t* rgb =
-            picture.Pixel(std::min(px, picture.width - 1), std::min(py, picture.height - 1));
+            image.Pixel(std::min(px, image.width - 1), std::min(py, image.height - 1));
         const std::uint32_t yuv = RGB2YUV(Packed(rgb[0], rgb[1], rgb[2]));
         result.pixels_[result.Offset(px, py)] = Component(yuv, 2);
         u += Component(yuv, 1);
@@ -93,7 +93,7 @@ CameraPicture CameraPicture::Nv21(const Picture& picture) {
   return result;
 }
 
-NSVL_OFFSCREEN CameraPicture::Descriptor() {
+NSVL_OFFSCREEN CameraImage::Descriptor() {
   NSVL_OFFSCREEN descriptor{};
   descriptor.pixelFormat = format_;
   descriptor.width = width_;
@@ -107,11 +107,11 @@ NSVL_OFFSCREEN CameraPicture::Descriptor() {
   return descriptor;
 }
 
-Picture CameraPicture::ToPicture(int width, int height) const {
-  Picture picture(width, height);
+Image CameraImage::ToImage(int width, int height) const {
+  Image image(width, height);
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
-      std::uint8_t* rgba = picture.Pixel(x, y);
+      std::uint8_t* rgba = image.Pixel(x, y);
       const std::uint8_t* pixel = &pixels_[Offset(x, y)];
       if (format_ == N3DS_FORMAT_NV21) {
         const std::uint8_t* vu = &chroma_[ChromaOffset(x, y)];
@@ -123,7 +123,7 @@ Picture CameraPicture::ToPicture(int width, int height) const {
       if (format_ == N3DS_FORMAT_BGRA32) rgba[3] = pixel[3];
     }
   }
-  return picture;
+  return image;
 }
 
 }  // namespace n3ds::tool

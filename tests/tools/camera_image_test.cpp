@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
-// Pictures in camera formats, and the mask's way onto them against the graphics system's drawing.
-#include "render/camera_picture.h"
+// Images in camera formats, and the mask's way onto them against the graphics system's drawing.
+#include "render/camera_image.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -19,39 +19,39 @@ namespace {
 
 using ::testing::Each;
 
-Picture Colours(int width, int height) {
-  Picture picture(width, height);
+Image Colours(int width, int height) {
+  Image image(width, height);
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
-      std::uint8_t* p = picture.Pixel(x, y);
+      std::uint8_t* p = image.Pixel(x, y);
       // The same in blocks of 2 x 2 pixels, so that halved chroma loses nothing.
       p[0] = static_cast<std::uint8_t>(40 + 37 * (x / 2) % 170);
       p[1] = static_cast<std::uint8_t>(40 + 53 * (y / 2) % 170);
       p[2] = static_cast<std::uint8_t>(40 + 29 * (x / 2 + y / 2) % 170);
     }
   }
-  return picture;
+  return image;
 }
 
-TEST(CameraPicture, PackedFormatsReadBack) {
-  const Picture picture = Colours(7, 5);
-  EXPECT_EQ(CameraPicture::Bgr24(picture).ToPicture(7, 5).rgba, picture.rgba);
-  Picture with_alpha = picture;
+TEST(CameraImage, PackedFormatsReadBack) {
+  const Image image = Colours(7, 5);
+  EXPECT_EQ(CameraImage::Bgr24(image).ToImage(7, 5).rgba, image.rgba);
+  Image with_alpha = image;
   with_alpha.Pixel(3, 2)[3] = 99;
-  EXPECT_EQ(CameraPicture::Bgra32(with_alpha).ToPicture(7, 5).rgba, with_alpha.rgba);
+  EXPECT_EQ(CameraImage::Bgra32(with_alpha).ToImage(7, 5).rgba, with_alpha.rgba);
 }
 
-TEST(CameraPicture, DescribesItsPlanes) {
-  const Picture picture = Colours(7, 5);
-  CameraPicture packed = CameraPicture::Bgr24(picture);
+TEST(CameraImage, DescribesItsPlanes) {
+  const Image image = Colours(7, 5);
+  CameraImage packed = CameraImage::Bgr24(image);
   const NSVL_OFFSCREEN bgr = packed.Descriptor();
   EXPECT_EQ(bgr.pixelFormat, static_cast<std::uint32_t>(N3DS_FORMAT_BGR24));
   EXPECT_EQ(bgr.width, 7);
   EXPECT_EQ(bgr.pitch[0], 21);
-  EXPECT_EQ(bgr.plane[0][0], picture.Pixel(0, 0)[2]);  // blue first
+  EXPECT_EQ(bgr.plane[0][0], image.Pixel(0, 0)[2]);  // blue first
   EXPECT_EQ(bgr.plane[1], nullptr);
 
-  CameraPicture planes = CameraPicture::Nv21(picture);
+  CameraImage planes = CameraImage::Nv21(image);
   const NSVL_OFFSCREEN nv21 = planes.Descriptor();
   EXPECT_EQ(nv21.width, 8);
   EXPECT_EQ(nv21.height, 6);
@@ -59,33 +59,33 @@ TEST(CameraPicture, DescribesItsPlanes) {
   EXPECT_EQ(nv21.pitch[1], 8);
 }
 
-TEST(CameraPicture, ChromaHasVBeforeU) {
-  Picture red(2, 2);
+TEST(CameraImage, ChromaHasVBeforeU) {
+  Image red(2, 2);
   for (int k = 0; k < 4; ++k) std::copy_n(std::begin({200, 0, 0}), 3, &red.rgba[4 * k]);
-  CameraPicture planes = CameraPicture::Nv21(red);
+  CameraImage planes = CameraImage::Nv21(red);
   const NSVL_OFFSCREEN nv21 = planes.Descriptor();
   EXPECT_GT(nv21.plane[1][0], 200);  // V follows red
   EXPECT_LT(nv21.plane[1][1], 110);  // U follows blue
 }
 
-TEST(CameraPicture, TwoPlanesKeepColoursThatShareABlock) {
+TEST(CameraImage, TwoPlanesKeepColoursThatShareABlock) {
   for (const auto& [width, height] : {std::pair{8, 6}, {7, 5}, {1, 1}}) {
-    const Picture picture = Colours(width, height);
-    const Picture again = CameraPicture::Nv21(picture).ToPicture(width, height);
-    for (std::size_t i = 0; i < picture.rgba.size(); ++i) {
-      EXPECT_NEAR(again.rgba[i], picture.rgba[i], 3) << width << " " << i;
+    const Image image = Colours(width, height);
+    const Image again = CameraImage::Nv21(image).ToImage(width, height);
+    for (std::size_t i = 0; i < image.rgba.size(); ++i) {
+      EXPECT_NEAR(again.rgba[i], image.rgba[i], 3) << width << " " << i;
     }
   }
 }
 
-TEST(CameraPicture, StartsClear) {
-  const Picture clear = CameraPicture::ClearBgra32(3, 2).ToPicture(3, 2);
+TEST(CameraImage, StartsClear) {
+  const Image clear = CameraImage::ClearBgra32(3, 2).ToImage(3, 2);
   EXPECT_THAT(clear.rgba, Each(0));
 }
 
 // Red on the left half of the face, green on the right.
-Picture HalfAndHalf() {
-  Picture texture(256, 256);
+Image HalfAndHalf() {
+  Image texture(256, 256);
   for (int y = 0; y < 256; ++y) {
     for (int x = 0; x < 256; ++x) {
       std::uint8_t* p = texture.Pixel(x, y);
@@ -106,19 +106,19 @@ TEST(CoreSession, MasksHideTheirFarSideAsTheRendererDoes) {
   EngineSession engine(DefaultModelPath(), header, TrackMode::kMask);
   CoreSession core(DefaultModelPath(), header);
   constexpr SceneParts kNothing = {false, false, false, false, false};
-  Picture ground(header.width, header.height);
+  Image ground(header.width, header.height);
   std::fill(ground.rgba.begin(), ground.rgba.end(), std::uint8_t{0});
   Scene scene(header, DefaultModelPath(), kNothing, ground, header.width, header.height,
               HalfAndHalf());
-  CameraPicture texture = CameraPicture::Bgra32(HalfAndHalf());
+  CameraImage texture = CameraImage::Bgra32(HalfAndHalf());
   for (std::size_t f = 0; f < track.frames.size(); ++f) {
     const FrameResult result = engine.Process(track.frames[f]);
     core.Process(track.frames[f]);
     if (f % 11 != 0) continue;
-    const Picture drawn = scene.Draw(result, engine.texture_coordinates());
-    CameraPicture mask = CameraPicture::ClearBgra32(header.width, header.height);
+    const Image drawn = scene.Draw(result, engine.texture_coordinates());
+    CameraImage mask = CameraImage::ClearBgra32(header.width, header.height);
     core.Warp(texture.Descriptor(), 0, mask.Descriptor());
-    const Picture warped = mask.ToPicture(header.width, header.height);
+    const Image warped = mask.ToImage(header.width, header.height);
     std::size_t covered = 0;
     std::size_t different = 0;
     for (std::size_t i = 0; i < drawn.rgba.size(); i += 4) {
