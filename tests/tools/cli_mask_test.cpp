@@ -249,6 +249,10 @@ TEST_F(CliMask, WritesWhatTheEndingAsksFor) {
   EXPECT_EQ(outcome.exit_code, 0) << outcome.err;
   EXPECT_EQ(folder_.Read("a.jpg").substr(0, 2), "\xff\xd8");
   EXPECT_EQ(ReadImage(folder_.Path("a.jpg")).width, 512);
+  const Outcome piped = Run(mask("/dev/stdout"));
+  EXPECT_EQ(piped.exit_code, 0) << piped.err;
+  EXPECT_EQ(piped.out.substr(1, 3), "PNG");
+  EXPECT_THAT(piped.out.substr(piped.out.size() - 8), HasSubstr("IEND"));
   ExpectFailure(mask(folder_.Path("a.gif")), kUsage,
                 "a.gif: unknown ending .gif (known: .png, .jpg, .jpeg)", {"a.jpg"});
   ExpectFailure(mask(photo), kUsage, "is also an input", {"a.jpg"});

@@ -170,6 +170,17 @@ TEST_F(Cli, ResultsOnStandardOutputComeAlone) {
   EXPECT_THAT(outcome.err, HasSubstr("frames "));
 }
 
+TEST_F(Cli, OtherOutputsOnStandardOutputComeAloneToo) {
+  const Outcome csv = Run({"eval", ExampleTrack("synthetic_three"), "--csv", "/dev/stdout"});
+  EXPECT_EQ(csv.exit_code, 0);
+  EXPECT_EQ(std::count(csv.out.begin(), csv.out.end(), '\n'), 2);
+  EXPECT_THAT(csv.err, HasSubstr("head frame"));
+  const Outcome obj = Run({"model", "export", kModel, "--obj", "/dev/stdout"});
+  EXPECT_EQ(obj.exit_code, 0);
+  EXPECT_THAT(obj.out, AllOf(HasSubstr("\nf "), Not(HasSubstr("/dev/stdout"))));
+  EXPECT_EQ(obj.err, "/dev/stdout\n");
+}
+
 TEST_F(Cli, RoundsFractionsAndSaysSoOnce) {
   std::string text = ReadFile(ExampleTrack("real_man_270_mirror"));
   const std::string whole = console_.Write("whole.track.jsonl", text);

@@ -4,9 +4,9 @@
 #include <CLI/Config.hpp>
 #include <CLI/Formatter.hpp>
 #include <cstdio>
-#include <iostream>
 #include <memory>
 #include <optional>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -82,15 +82,19 @@ void RunEvalCommand(const EvalOptions& options) {
     table.PrintCsv(out.stream());
     out.Commit();
   }
+  std::FILE* const console = ConsoleBeside(options.csv);
+  std::ostringstream text;
   if (options.wide) {
-    table.Print(std::cout);
+    table.Print(text);
   } else {
-    table.Print(std::cout, MainColumns(!meshes.empty()));
+    table.Print(text, MainColumns(!meshes.empty()));
   }
+  std::fputs(text.str().c_str(), console);
   const Vector3 turn = RotationVector(offset.rotation);
-  std::printf("head frame: turned by %.2f %.2f %.2f degrees, origin at %.1f %.1f %.1f mm\n",
-              turn[0], turn[1], turn[2], offset.origin[0], offset.origin[1], offset.origin[2]);
-  std::printf("\n%s%s", kScoreTableLegend, meshes.empty() ? "" : kMeshColumnsLegend);
+  std::fprintf(console,
+               "head frame: turned by %.2f %.2f %.2f degrees, origin at %.1f %.1f %.1f mm\n",
+               turn[0], turn[1], turn[2], offset.origin[0], offset.origin[1], offset.origin[2]);
+  std::fprintf(console, "\n%s%s", kScoreTableLegend, meshes.empty() ? "" : kMeshColumnsLegend);
 }
 
 }  // namespace

@@ -79,8 +79,8 @@ void RunMaskCommand(const MaskOptions& options) {
     session.Blend(mask.Descriptor(), image.Descriptor());
   }
   WriteImage(options.out, format, image.ToImage(photo.width, photo.height));
-  std::printf("%s: %zu %s\n", options.out.c_str(), session.faces(),
-              session.faces() == 1 ? "face" : "faces");
+  std::fprintf(ConsoleBeside(options.out), "%s: %zu %s\n", options.out.c_str(), session.faces(),
+               session.faces() == 1 ? "face" : "faces");
 }
 
 }  // namespace

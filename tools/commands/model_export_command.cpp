@@ -25,7 +25,7 @@ void RunModelExport(const ExportOptions& options) {
   FormatOf("--obj", options.obj, {OutputFormat::kObj});
   CheckIsNoInput(options.obj, {options.face.model});
   WriteFaceObj(options.obj, options.face.face());
-  std::printf("%s\n", options.obj.c_str());
+  std::fprintf(ConsoleBeside(options.obj), "%s\n", options.obj.c_str());
 }
 
 }  // namespace

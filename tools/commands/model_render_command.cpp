@@ -29,7 +29,7 @@ void RunModelRender(const RenderOptions& options) {
   CheckIsNoInput(options.out, {options.face.model});
   const Points face = options.face.face();
   WriteImage(options.out, format, DrawTurntable(face, options.views, options.size));
-  std::printf("%s\n", options.out.c_str());
+  std::fprintf(ConsoleBeside(options.out), "%s\n", options.out.c_str());
 }
 
 }  // namespace

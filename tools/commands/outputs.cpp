@@ -69,11 +69,14 @@ void WriteImage(const std::string& path, OutputFormat format, const Image& image
   }
 }
 
-bool IsStandardOutput(const std::string& path) {
+std::FILE* ConsoleBeside(const std::string& output) {
   struct stat named {};
   struct stat standard {};
-  return stat(path.c_str(), &named) == 0 && fstat(STDOUT_FILENO, &standard) == 0 &&
-         named.st_dev == standard.st_dev && named.st_ino == standard.st_ino;
+  // On a terminal both may appear.
+  const bool is_same = stat(output.c_str(), &named) == 0 && fstat(STDOUT_FILENO, &standard) == 0 &&
+                       !S_ISCHR(standard.st_mode) && named.st_dev == standard.st_dev &&
+                       named.st_ino == standard.st_ino;
+  return is_same ? stderr : stdout;
 }
 
 void CheckIsNoInput(const std::string& output, const std::vector<std::string>& inputs) {

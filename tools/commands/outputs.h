@@ -2,6 +2,7 @@
 // What commands write: which format, and not over what they read.
 #pragma once
 
+#include <cstdio>
 #include <string>
 #include <vector>
 
@@ -20,8 +21,9 @@ OutputFormat FormatOf(const std::string& option, const std::string& path,
 // Writes a PNG or a JPEG, whole or not at all. Throws Error.
 void WriteImage(const std::string& path, OutputFormat format, const Image& image);
 
-// Whether a path leads to where standard output goes.
-bool IsStandardOutput(const std::string& path);
+// Where a command says what it has done: standard output, or standard error when the path of its
+// output leads to where standard output goes, whose reader wants that output alone.
+std::FILE* ConsoleBeside(const std::string& output);
 
 // Throws UsageError when `output` is the same file as one of the inputs, by whatever name. "-"
 // stands for standard input.

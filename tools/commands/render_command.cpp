@@ -213,7 +213,7 @@ void RunRenderCommand(const RenderOptions& options) {
   CheckIsNoInput(options.out, Inputs(options, model));
   const Track track = LoadTrack(options.track);
   Drawing(track, options, parts, format, model).Run();
-  std::printf("%s\n", options.out.c_str());
+  std::fprintf(ConsoleBeside(options.out), "%s\n", options.out.c_str());
 }
 
 }  // namespace

@@ -165,8 +165,7 @@ void RunTrackCommand(const TrackOptions& options) {
   if (out) out->Commit();
   TellRounding(input.name(), track.rounded_coordinates());
 
-  // Whoever reads the results from standard output does not want the summary there.
-  std::FILE* const console = IsStandardOutput(options.out) ? stderr : stdout;
+  std::FILE* const console = ConsoleBeside(options.out);
   const Summary& summary = summarizer.summary();
   PrintSummary(console, TrackName(input.name()), summary, options.engine.mode());
   if (out) {
