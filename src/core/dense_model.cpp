@@ -33,7 +33,7 @@ void SumBasis(const float* coefficients, const int16_t* basis, ptrdiff_t first, 
   std::fill_n(sums, count, 0.0f);
   for (int k = 0; k < kCount; k += kSumGroup) {
     const int16_t* vectors[kSumGroup];
-    for (int g = 0; g < kSumGroup; g++) {
+    for (int g = 0; g < kSumGroup; ++g) {
       vectors[g] = basis + static_cast<ptrdiff_t>(k + g) * kShapeSize + first;
     }
     AddWeighted(coefficients + k, vectors, count, sums);
@@ -41,14 +41,14 @@ void SumBasis(const float* coefficients, const int16_t* basis, ptrdiff_t first, 
 }
 
 // The interaction of identity and expression. Only pairs of even index sum take part, as in the
-// expression fit, except that the last identity takes every expression here, deliberately.
+// expression fit, except that the last identity takes every expression here.
 void SumInteraction(const int16_t* products, const int16_t* tensor, ptrdiff_t first, int count,
                     int32_t* sums) {
   std::fill_n(sums, count, 0);
   int16_t weights[kSumGroup] = {};
   const int16_t* vectors[kSumGroup] = {};
   int filled = 0;
-  for (int k = 0; k < kIdentityCount; k++) {
+  for (int k = 0; k < kIdentityCount; ++k) {
     const bool last = k == kIdentityCount - 1;
     for (int j = last ? 0 : k % 2; j < kExpressionCount; j += last ? 1 : 2) {
       const int pair = k * kExpressionCount + j;
@@ -62,7 +62,7 @@ void SumInteraction(const int16_t* products, const int16_t* tensor, ptrdiff_t fi
     }
   }
   if (filled == 0) return;
-  for (int g = filled; g < kSumGroup; g++) {
+  for (int g = filled; g < kSumGroup; ++g) {
     weights[g] = 0;
     vectors[g] = vectors[0];
   }
@@ -78,7 +78,7 @@ void BuildBlock(const FaceMeshTask& task, ptrdiff_t first, int count) {
   SumInteraction(task.products, task.tensor, first, count, interaction);
   const int16_t* mean = task.meanShape + first;
   float* shape = task.shape + first;
-  for (int i = 0; i < count; i++) {
+  for (int i = 0; i < count; ++i) {
     // The scale is a power of two, so this rounds once, where the integer becomes a float.
     const float product_sum = static_cast<float>(interaction[i]) * kProductUnit;
     shape[i] =
@@ -88,7 +88,7 @@ void BuildBlock(const FaceMeshTask& task, ptrdiff_t first, int count) {
 
 void FillTasks(TrackingContext* context, int32_t face, const int16_t* products,
                FaceMeshTask* tasks) {
-  for (int quarter = 0; quarter < kMeshTasksPerFace; quarter++) {
+  for (int quarter = 0; quarter < kMeshTasksPerFace; ++quarter) {
     tasks[quarter] = {context->meanShape,
                       context->identityBasis,
                       context->expressionBasis,
@@ -102,7 +102,7 @@ void FillTasks(TrackingContext* context, int32_t face, const int16_t* products,
   }
 }
 
-// Queues all tasks and waits for every one, whatever becomes of the others: they use the records.
+// Queues all tasks and waits for all of them even after a failure: workers still hold the records.
 MRESULT RunTasks(TrackingContext* context, void* pool, int32_t face_count) {
   const auto task_count = static_cast<size_t>(face_count) * kMeshTasksPerFace;
   const ScratchArray<FaceMeshTask> tasks(context->memory, task_count);
@@ -110,16 +110,16 @@ MRESULT RunTasks(TrackingContext* context, void* pool, int32_t face_count) {
   const ScratchArray<int16_t> products(context->memory,
                                        static_cast<size_t>(kProductCount * face_count));
   if (!tasks || !ids || !products) return N3DS_NO_MEMORY;
-  for (int32_t f = 0; f < face_count; f++) {
+  for (int32_t f = 0; f < face_count; ++f) {
     int16_t* table = products.get() + static_cast<ptrdiff_t>(f) * kProductCount;
     BuildProductTable(context->identityCoef[f], context->expressionCoef[f], table);
     FillTasks(context, f, table, tasks.get() + static_cast<ptrdiff_t>(f) * kMeshTasksPerFace);
   }
-  for (size_t i = 0; i < task_count; i++) {
+  for (size_t i = 0; i < task_count; ++i) {
     ids[i] = mcvAddTask(pool, _GetFace3DModel_Thread, &tasks[i]);
   }
   MRESULT result = N3DS_OK;
-  for (size_t i = 0; i < task_count; i++) {
+  for (size_t i = 0; i < task_count; ++i) {
     if (ids[i] < 0 || mcvWaitTask(pool, ids[i]) != 0) result = N3DS_NUMERICAL;
   }
   return result;
@@ -137,8 +137,8 @@ MRESULT BuildMeshes(TrackingContext* context, int32_t face_count) {
 }  // namespace
 
 void BuildProductTable(const float* identity, const float* expression, int16_t* products) {
-  for (int k = 0; k < kIdentityCount; k++) {
-    for (int j = 0; j < kExpressionCount; j++) {
+  for (int k = 0; k < kIdentityCount; ++k) {
+    for (int j = 0; j < kExpressionCount; ++j) {
       const int32_t product = TruncateToInt32(identity[k] * expression[j] * 32768.0f);
       const auto wrapped = static_cast<int16_t>(static_cast<uint16_t>(product));
       products[k * kExpressionCount + j] =

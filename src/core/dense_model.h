@@ -27,7 +27,7 @@ struct FaceMeshTask {
 };
 
 // Products identity[k] * expression[j] at k * 20 + j, with 15 fractional bits in 16: values outside
-// -1..1 wrap, and -32768 becomes -32767, as AddProducts demands.
+// -1..1 wrap, and -32768 becomes -32767.
 void BuildProductTable(const float* identity, const float* expression, int16_t* products);
 
 // Takes a FaceMeshTask, computes the vertices of its range and returns null.

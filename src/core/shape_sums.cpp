@@ -8,18 +8,18 @@ namespace n3ds {
 
 void AddWeightedPortable(const float* weights, const int16_t* const* vectors, int count,
                          float* sums) {
-  for (int i = 0; i < count; i++) {
+  for (int i = 0; i < count; ++i) {
     float sum = sums[i];
-    for (int g = 0; g < kSumGroup; g++) sum += weights[g] * static_cast<float>(vectors[g][i]);
+    for (int g = 0; g < kSumGroup; ++g) sum += weights[g] * static_cast<float>(vectors[g][i]);
     sums[i] = sum;
   }
 }
 
 void AddProductsPortable(const int16_t* weights, const int16_t* const* vectors, int count,
                          int32_t* sums) {
-  for (int i = 0; i < count; i++) {
+  for (int i = 0; i < count; ++i) {
     int32_t sum = sums[i];
-    for (int g = 0; g < kSumGroup; g++) sum = WrapAdd(sum, weights[g] * vectors[g][i]);
+    for (int g = 0; g < kSumGroup; ++g) sum = WrapAdd(sum, weights[g] * vectors[g][i]);
     sums[i] = sum;
   }
 }
@@ -40,7 +40,7 @@ N3DS_AVX2_CODE int AddWeightedWide(const float* weights, const int16_t* const* v
   for (; i + kWideLanes <= count; i += kWideLanes) {
     __m256 low = _mm256_loadu_ps(sums + i);
     __m256 high = _mm256_loadu_ps(sums + i + 8);
-    for (int g = 0; g < kSumGroup; g++) {
+    for (int g = 0; g < kSumGroup; ++g) {
       const __m256 weight = _mm256_set1_ps(weights[g]);
       const int16_t* v = vectors[g] + i;
       const __m256 low_terms = _mm256_cvtepi32_ps(_mm256_cvtepi16_epi32(I16x8::Load(v).v));
@@ -97,7 +97,7 @@ struct Tail {
   const int16_t* vectors[kSumGroup];
 
   Tail(const int16_t* const* from, int i) {
-    for (int g = 0; g < kSumGroup; g++) vectors[g] = from[g] + i;
+    for (int g = 0; g < kSumGroup; ++g) vectors[g] = from[g] + i;
   }
 };
 
@@ -107,7 +107,7 @@ void AddWeighted(const float* weights, const int16_t* const* vectors, int count,
   int i = HasAvx2() ? AddWeightedWide(weights, vectors, count, sums) : 0;
   for (; i + kLanes <= count; i += kLanes) {
     F32x4 low = F32x4::Load(sums + i), high = F32x4::Load(sums + i + 4);
-    for (int g = 0; g < kSumGroup; g++) {
+    for (int g = 0; g < kSumGroup; ++g) {
       const F32x4 weight = F32x4::Splat(weights[g]);
       const I16x8 elements = I16x8::Load(vectors[g] + i);
       low = low + weight * ToFloat(WidenLow(elements));

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: MIT
 // Weighted sums of the model's 16-bit vectors, coordinate by coordinate: what a face's mesh is made
-// of. Lanes of the vector forms are different coordinates, never different terms of one sum, so
-// every form gives the same bits as the portable one, which is the definition.
+// of. Lanes of the vector forms are different coordinates, and float terms are added in order;
+// integer terms may be added in pairs, which sums that wrap do not show. So every form gives the
+// same bits as the portable one, which is the definition.
 #pragma once
 
 #include <cstdint>
@@ -16,8 +17,7 @@ void AddWeighted(const float* weights, const int16_t* const* vectors, int count,
 void AddWeightedPortable(const float* weights, const int16_t* const* vectors, int count,
                          float* sums);
 
-// The same in integers; the sums wrap. No weight may be -32768: the vector form adds two products
-// before it adds to the sum, and two of (-32768)^2 do not fit 32 bits.
+// The same in integers; the sums wrap.
 void AddProducts(const int16_t* weights, const int16_t* const* vectors, int count, int32_t* sums);
 void AddProductsPortable(const int16_t* weights, const int16_t* const* vectors, int count,
                          int32_t* sums);

@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <vector>
@@ -58,8 +59,9 @@ TEST(ShapeSums, ProductFormsGiveTheSameBits) {
   for (int count = 0; count <= 70; count++) {
     const Vectors vectors(count, &random);
     int16_t weights[kSumGroup];
-    for (int16_t& w : weights) w = static_cast<int16_t>(random.Int(-INT16_MAX, INT16_MAX));
-    weights[count % kSumGroup] = count % 2 == 0 ? INT16_MAX : -INT16_MAX;
+    for (int16_t& w : weights) w = static_cast<int16_t>(random.Int(INT16_MIN, INT16_MAX));
+    weights[count % kSumGroup] = count % 2 == 0 ? INT16_MAX : INT16_MIN;
+    if (count % 5 == 0) std::fill_n(weights, kSumGroup, int16_t{INT16_MIN});
     std::unique_ptr<int32_t[]> sums(new int32_t[count]), expected(new int32_t[count]);
     for (int i = 0; i < count; i++) {
       sums[i] = expected[i] = random.Int(INT32_MIN, INT32_MAX);
