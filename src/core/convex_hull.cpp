@@ -66,6 +66,40 @@ int32_t SkipRejected(const HullPoint* points, int32_t j, int32_t count, const Hu
   return j;
 }
 
+// Whether a point of that score is preferred to the best one of the step.
+bool IsBetter(float score, const HullPoint& point, float best_score, const HullPoint& best) {
+  const double gain = Difference(score, best_score);
+  return gain > kScoreTolerance || (std::fabs(gain) < kScoreTolerance && point.x <= best.x);
+}
+
+// Chooses the point that follows `current` in a walk that arrived along `incoming`. *best stays
+// what it was when no point is accepted; such a step repeats the choice before it. Returns whether
+// the hull closes instead, because the start lies straighter ahead than a point that is nearly so.
+bool ChooseNext(const HullPoint* points, int32_t count, const HullPoint& start,
+                const HullPoint& current, const Direction& incoming, HullPoint* best) {
+  if (IsShort(incoming)) return false;
+  const float incoming_squared = Dot(incoming, incoming);
+  float best_score = -1.0f;
+  const auto skip = [&](int32_t j) {
+    return SkipRejected(points, j, count, current, incoming, incoming_squared, best_score);
+  };
+  for (int32_t j = skip(0); j < count; j = skip(j + 1)) {
+    const Direction outgoing = Between(current.x, current.y, points[j]);
+    if (j == current.index || IsShort(outgoing)) continue;
+    if (incoming.x * outgoing.y < outgoing.x * incoming.y) continue;  // on the outer side
+    const float score = TurnScore(incoming, outgoing);
+    if (!IsBetter(score, points[j], best_score, *best)) continue;
+    best_score = score;
+    *best = points[j];
+    if (static_cast<double>(best_score) > kStraightScore) {
+      const Direction home = Between(current.x, current.y, start);
+      return Dot(incoming, home) > 0.0f &&
+             Difference(TurnScore(incoming, home), best_score) > kScoreTolerance;
+    }
+  }
+  return false;
+}
+
 }  // namespace
 
 int32_t SearchConvexHull(const HullPoint* points, int32_t count, HullPoint* hull,
@@ -74,47 +108,19 @@ int32_t SearchConvexHull(const HullPoint* points, int32_t count, HullPoint* hull
     return N3DS_BAD_VALUE;
   }
   HullPoint start = points[0];
-  for (int32_t i = 1; i < count; i++) {
+  for (int32_t i = 1; i < count; ++i) {
     if (points[i].y < start.y) start = points[i];
   }
   *hull_count = 0;
   if (start.index == -1 || (start.x == 0 && start.y == 0)) return N3DS_OK;
 
   HullPoint current = start;
-  HullPoint best =
-      start;  // survives a step that accepts no point: the step then repeats the choice
+  HullPoint best = start;
   Direction incoming = {1.0f, 0.0f};
   for (;;) {
     hull[*hull_count] = current;
-    float best_score = -1.0f;
-    const float incoming_squared = Dot(incoming, incoming);
-    const auto skip = [&](int32_t j) {
-      return SkipRejected(points, j, count, current, incoming, incoming_squared, best_score);
-    };
-    for (int32_t j = skip(0); j < count; j = skip(j + 1)) {
-      if (j == current.index) continue;
-      if (IsShort(incoming)) continue;
-      const Direction outgoing = Between(current.x, current.y, points[j]);
-      if (IsShort(outgoing)) continue;
-      if (incoming.x * outgoing.y < outgoing.x * incoming.y) continue;  // on the outer side
-      const float score = TurnScore(incoming, outgoing);
-      const double gain = Difference(score, best_score);
-      const bool same_turn = std::fabs(gain) < kScoreTolerance;
-      if (!(gain > kScoreTolerance || (same_turn && points[j].x <= best.x))) continue;
-      best_score = score;
-      best = points[j];
-      if (static_cast<double>(best_score) > kStraightScore) {
-        // Nearly straight on; but if the start lies straighter still, the hull closes here.
-        const Direction home = Between(current.x, current.y, start);
-        if (Dot(incoming, home) > 0.0f &&
-            Difference(TurnScore(incoming, home), best_score) > kScoreTolerance) {
-          ++*hull_count;
-          return N3DS_OK;
-        }
-        break;
-      }
-    }
     ++*hull_count;
+    if (ChooseNext(points, count, start, current, incoming, &best)) return N3DS_OK;
     if (best.index == start.index || *hull_count > kMaxHullPoints ||
         (best.x == start.x && best.y == start.y)) {
       return N3DS_OK;

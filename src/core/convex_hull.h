@@ -1,8 +1,11 @@
 // SPDX-License-Identifier: MIT
-// Convex hull of projected points, by gift wrapping that prefers the smallest turn.
+// Convex hull of projected points, by gift wrapping (R. A. Jarvis, "On the identification of the
+// convex hull of a finite set of points in the plane", 1973) that prefers the smallest turn.
 #pragma once
 
 #include <cstdint>
+
+#include "core/model_tables.h"
 
 namespace n3ds {
 
@@ -13,7 +16,7 @@ struct HullPoint {
 };
 
 // A walk ends when it has more hull points than this, so an output array has room for one more.
-constexpr int kMaxHullPoints = 533;
+constexpr int kMaxHullPoints = kContourCandidateCount - 1;
 
 // Walks round the points, starting at the one with the smallest y towards +x.
 //   points  count points; the walk is empty when the start point's index is -1 or it lies at (0, 0)

@@ -4,8 +4,6 @@
 #include <algorithm>
 #include <cstddef>
 
-#include "platform/integer_arithmetic.h"
-
 namespace n3ds {
 
 namespace {
@@ -18,7 +16,7 @@ bool IsPlain(int32_t coordinate) {
 }
 
 // Keys order candidates as the rules do: by squared distance, then by class, then from the last to
-// the first. The start goes before all that are as far as it is.
+// the first. On equal distance the start wins.
 constexpr int32_t kRanksOfClass = 1024;
 constexpr int64_t kRanks = 4 * kRanksOfClass;
 constexpr int64_t kStartRank = 0;  // the last candidate's is far above
@@ -32,9 +30,7 @@ int32_t CandidateOfRank(int64_t rank) {
 }
 
 int64_t KeyOfCandidate(const HullPoint* candidates, int32_t n, int32_t x, int32_t y) {
-  const int32_t dx = WrapSubtract(candidates[n].x, x);
-  const int32_t dy = WrapSubtract(candidates[n].y, y);
-  return KeyOf(WrapAdd(WrapMultiply(dx, dx), WrapMultiply(dy, dy)), RankOf(n));
+  return KeyOf(SquaredDistance(candidates[n].x, candidates[n].y, x, y), RankOf(n));
 }
 
 // How far outside of an interval a coordinate lies.
@@ -46,11 +42,11 @@ int32_t Outside(int32_t low, int32_t high, int32_t value) {
 
 NearestCandidateSearch::NearestCandidateSearch(const HullPoint* candidates)
     : candidates_(candidates) {
-  for (int g = 0; g < kGroups; g++) {
+  for (int g = 0; g < kGroups; ++g) {
     const HullPoint* group = candidates + static_cast<ptrdiff_t>(g) * kGroupSize;
     left_[g] = right_[g] = group[0].x;
     top_[g] = bottom_[g] = group[0].y;
-    for (int i = 1; i < kGroupSize; i++) {
+    for (int i = 1; i < kGroupSize; ++i) {
       left_[g] = std::min(left_[g], group[i].x);
       right_[g] = std::max(right_[g], group[i].x);
       top_[g] = std::min(top_[g], group[i].y);
@@ -65,7 +61,7 @@ FoundCandidate NearestCandidateSearch::Find(int32_t x, int32_t y, const FoundCan
   int32_t nearest_possible[kGroups] = {};
   const bool may_skip = may_skip_ && IsPlain(x) && IsPlain(y);
   if (may_skip) {
-    for (int g = 0; g < kGroups; g++) {
+    for (int g = 0; g < kGroups; ++g) {
       const int32_t dx = Outside(left_[g], right_[g], x);
       const int32_t dy = Outside(top_[g], bottom_[g], y);
       nearest_possible[g] = dx * dx + dy * dy;
@@ -73,9 +69,9 @@ FoundCandidate NearestCandidateSearch::Find(int32_t x, int32_t y, const FoundCan
   }
   int64_t best = std::min(KeyOf(start.squared_distance, kStartRank),
                           KeyOfCandidate(candidates_, last_found_, x, y));
-  for (int g = 0; g < kGroups; g++) {
+  for (int g = 0; g < kGroups; ++g) {
     if (may_skip && nearest_possible[g] * kRanks > best) continue;
-    for (int32_t n = g * kGroupSize; n < (g + 1) * kGroupSize; n++) {
+    for (int32_t n = g * kGroupSize; n < (g + 1) * kGroupSize; ++n) {
       best = std::min(best, KeyOfCandidate(candidates_, n, x, y));
     }
   }

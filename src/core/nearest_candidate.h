@@ -1,28 +1,36 @@
 // SPDX-License-Identifier: MIT
-// The contour candidate that lies nearest to a point of the picture.
+// The contour candidate that lies nearest to a point of the image.
 #pragma once
 
 #include <cstdint>
 
 #include "core/convex_hull.h"
+#include "core/model_tables.h"
+#include "platform/integer_arithmetic.h"
 
 namespace n3ds {
 
-// The candidates that are searched; the last two of the table have a rule of their own.
-constexpr int kSearchedCandidates = 532;
+// The candidates that are searched. The last two of the table are not: they are taken only near the
+// hull vertex from which a probe starts.
+constexpr int kSearchedCandidates = kContourCandidateCount - 2;
+
+// Between pixels; wraps.
+inline int32_t SquaredDistance(int32_t x0, int32_t y0, int32_t x1, int32_t y1) {
+  const int32_t dx = WrapSubtract(x0, x1);
+  const int32_t dy = WrapSubtract(y0, y1);
+  return WrapAdd(WrapMultiply(dx, dx), WrapMultiply(dy, dy));
+}
 
 struct FoundCandidate {
   int32_t candidate;
-  int32_t squared_distance;  // wraps, as all squared distances between pixels here
+  int32_t squared_distance;
 };
 
-// Candidates in fours next to each other fall into four classes by their number modulo 4. Among
-// equally near ones the first class wins, and in a class the last number: the order is part of the
-// result.
+// Candidate n belongs to class n % 4. Ties go to the lower class, and within a class to the higher
+// number.
 //
-// Most candidates are never looked at: they come in groups of neighbours on the face, each in a
-// rectangle, and a rectangle that is farther away than the nearest candidate so far holds no
-// nearer one.
+// Most candidates are never looked at: they are searched in groups of neighbours on the face, and a
+// group whose bounding rectangle is farther away than the nearest candidate so far is left out.
 class NearestCandidateSearch {
  public:
   // `candidates` must outlive the search.

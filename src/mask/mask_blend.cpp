@@ -55,8 +55,8 @@ void BlendChannel(const double* shading, const int32_t* alpha, const int32_t* ma
 }
 
 // The shading factor says how much of the mask's colour is left over a pixel: half over black, all
-// over white. These are not the converters' luma weights: red, skin's strongest channel, weighs most.
-// A transparent pixel keeps its colour.
+// over white. These are not the converters' luma weights: red, skin's strongest channel, weighs
+// most. A transparent pixel keeps its colour.
 void Blend(const MaskStrip& mask, ColourStrip* image) {
   double shading[kStripPixels];
   for (int i = 0; i < kStripPixels; ++i) {

@@ -202,8 +202,8 @@ void ScanConvert(Corner* corners, const TriangleFiller& filler, int32_t height) 
   }
 }
 
-// Where the mask's texture vertices are: the caller's layout, or the engine's own, whose table has v
-// pointing down.
+// Where the mask's texture vertices are: the caller's layout, or the engine's own, whose table has
+// v pointing down.
 struct TextureLayout {
   const float* coordinates;
   const uint16_t* triangles;

@@ -80,9 +80,9 @@ float GainRatio(const float* r, const float* r_new, size_t rows, const float* h,
 
 // h from (JtJ + damping I) h = -g. A is scratch of JtJ's size.
 //
-// The stored gradient changes its sign here on every pass, also after a rejected step. The pass that
-// follows a rejection therefore steps uphill; it is usually rejected too, so one failure raises the
-// damping twice.
+// The stored gradient changes its sign here on every pass, also after a rejected step. The pass
+// that follows a rejection therefore steps uphill; it is usually rejected too, so one failure
+// raises the damping twice.
 MRESULT FindStep(MHandle memory, const float* JtJ, float damping, int32_t parameters, float* A,
                  float* g, float* h) {
   const size_t n = static_cast<size_t>(parameters);

@@ -8,8 +8,8 @@
 
 namespace n3ds {
 
-// Float to integer as 64-bit Arm converts: toward zero, saturating, 0 for NaN. Plain casts of values
-// out of range are undefined and differ between x86-64 and Arm.
+// Float to integer as 64-bit Arm converts: toward zero, saturating, 0 for NaN. Plain casts of
+// values out of range are undefined and differ between x86-64 and Arm.
 inline int32_t TruncateToInt32(double value) {
   constexpr double kLowest = std::numeric_limits<int32_t>::min();
   constexpr double kHighest = std::numeric_limits<int32_t>::max();

@@ -14,8 +14,8 @@
 #include "norvale_3d_sticker_core.h"
 #include "platform/simd.h"
 
-// The vector form is written over AVX2 or NEON; with SSE2 alone, which has no fused multiply-add, or
-// without SIMD there is none.
+// The vector form is written over AVX2 or NEON; with SSE2 alone, which has no fused multiply-add,
+// or without SIMD there is none.
 #if N3DS_SIMD_AVX2
 #define N3DS_PRODUCT_CODE N3DS_AVX2_CODE
 #elif N3DS_SIMD_NEON

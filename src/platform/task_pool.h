@@ -26,8 +26,9 @@ struct WorkerStart {
   TaskPool* pool;
 };
 
-// The order of the members is part of the record. The rings are fixed arrays, so queueing and finishing tasks allocate nothing. The two locks are
-// never held together, and none while a task runs.
+// The order of the members is part of the record. The rings are fixed arrays, so queueing and
+// finishing tasks allocate nothing. The two locks are never held together, and none while a task
+// runs.
 struct TaskPool {
   pthread_mutex_t queueLock;  // guards tasks, taskHead, taskCount, stop and nextTaskId
   pthread_mutex_t doneLock;   // guards doneIds, doneHead and doneCount
