@@ -21,7 +21,12 @@ Direction Between(int32_t from_x, int32_t from_y, const HullPoint& to) {
           static_cast<float>(WrapSubtract(to.y, from_y))};
 }
 
-bool IsShort(const Direction& d) { return std::fabs(d.x) < 0.01f && std::fabs(d.y) < 0.01f; }
+// Directions between pixels are integers, so only one of no length is shorter than this.
+constexpr float kShortestDirection = 0.01f;
+
+bool IsShort(const Direction& d) {
+  return std::fabs(d.x) < kShortestDirection && std::fabs(d.y) < kShortestDirection;
+}
 
 float Dot(const Direction& a, const Direction& b) { return a.x * b.x + a.y * b.y; }
 

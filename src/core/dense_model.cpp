@@ -23,7 +23,8 @@ static_assert(kVerticesPerTask * kMeshTasksPerFace == kVertexCount);
 // cache level (16 kB, on the worker's stack) while the model's vectors stream past.
 constexpr int kBlock = 3 * kVerticesPerTask;
 
-constexpr float kProductUnit = 1.0f / 32768.0f;
+constexpr float kProductsPerUnit = 32768.0f;  // 15 fractional bits
+constexpr float kProductUnit = 1.0f / kProductsPerUnit;
 
 // sums[i] = sum of coefficients[k] * basis[k][first + i] over k in order, from 0.
 template <int kCount>
@@ -139,7 +140,7 @@ MRESULT BuildMeshes(TrackingContext* context, int32_t face_count) {
 void BuildProductTable(const float* identity, const float* expression, int16_t* products) {
   for (int k = 0; k < kIdentityCount; ++k) {
     for (int j = 0; j < kExpressionCount; ++j) {
-      const int32_t product = TruncateToInt32(identity[k] * expression[j] * 32768.0f);
+      const int32_t product = TruncateToInt32(identity[k] * expression[j] * kProductsPerUnit);
       const auto wrapped = static_cast<int16_t>(static_cast<uint16_t>(product));
       products[k * kExpressionCount + j] =
           std::max<int16_t>(wrapped, -std::numeric_limits<int16_t>::max());

@@ -153,7 +153,7 @@ void StoreTouchedBlocks(const YuvStrip& strip, const uint8_t* const* mask, int p
 
 // Blocks that the mask leaves alone are not written: the output holds the image there already. In a
 // block that it touches, transparent pixels make the trip through colour and back like the others,
-// because the block's chroma is averaged anew. A trailing odd row or column belongs to no block.
+// because the block's chroma is averaged again. A trailing odd row or column belongs to no block.
 void BlendNv21(const NSVL_OFFSCREEN& image, const NSVL_OFFSCREEN& mask,
                const NSVL_OFFSCREEN& output) {
   MaskStrip mask_strips[2] = {};

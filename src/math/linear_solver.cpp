@@ -16,7 +16,7 @@ using n3ds::ScratchArray;
 // system without enough evidence in it fails instead of giving wild values.
 constexpr double kMinPivot = 1e-6;
 
-// What is 0 or 1 in row i of L and U.
+// The zeros and the one that are fixed in row i of L and U.
 void WriteFixedParts(size_t i, size_t n, float* L, float* U) {
   std::fill_n(U + i * n, i, 0.0f);
   L[i * n + i] = 1.0f;

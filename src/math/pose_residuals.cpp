@@ -12,8 +12,8 @@
 namespace n3ds {
 namespace {
 
-// Points as near the camera plane as this have no projection. The limit is the double 1e-6; a float
-// does not exceed it exactly when it does not exceed the float, which is the nearest one below.
+// Points no farther from the camera plane than this have no projection. The limit is the double
+// 1e-6; as the float is the nearest one below it, floats compare with either alike.
 constexpr float kZeroDepth = 1e-6f;
 static_assert(static_cast<double>(kZeroDepth) < 1e-6);
 // Weight of a landmark that is neither eye corner nor nose, when the weighting is on.
@@ -87,8 +87,8 @@ PoseResiduals::PoseResiduals(const PoseProblem& problem)
     : problem_(problem), middle_(FindMiddleLine(problem)) {
   float by_group[] = {1.0f, 1.0f, 1.0f, 1.0f};
   if (problem.weighting_mode != 0) {
-    // The side of the nose that is turned away is seen worse: inner_weight below 1 marks the left
-    // one, above 1 the right one.
+    // The averted side of the nose is seen worse: inner_weight below 1 marks the left one, above 1
+    // the right one.
     const float w = problem.inner_weight;
     by_group[kOrdinary] = kOrdinaryFactor;
     by_group[kNoseLeft] = w < 1.0f ? w : 1.0f;

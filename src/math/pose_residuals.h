@@ -72,7 +72,7 @@ class PoseResiduals {
   static MiddleLine FindMiddleLine(const PoseProblem& problem);
   // In a unit of the line's own; 0 for all points when there is no line.
   F32x4 DistanceFromMiddle(F32x4 x, F32x4 y) const;
-  // Turns pairs along u and v, residuals or derivatives, into their part across the line, in the
+  // Reduces pairs along u and v, residuals or derivatives, to their part across the line, in the
   // lanes of `across`.
   void ProjectAcross(Mask32x4 across, F32x4* along_u, F32x4* along_v) const;
 
@@ -83,7 +83,7 @@ class PoseResiduals {
   static Derivatives Differentiate(const View& view, const Points& p);
   // The block's outline landmarks whose observation lies nearer the line than their projection.
   Mask32x4 AcrossOf(const Points& p, int32_t first) const;
-  // Writes u and v of `count` points in turns.
+  // Writes u0 v0 u1 v1 .. of `count` points.
   static void StorePairs(F32x4 u, F32x4 v, int32_t count, float* pairs);
   void StoreDerivatives(const Derivatives& d, int32_t first, int32_t count, float* J,
                         float* Jt) const;

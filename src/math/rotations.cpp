@@ -55,13 +55,13 @@ MRESULT RotationMatrixToQuat(const float* matrix, float* quat) {
 MRESULT QuatToEuler(const float* quat, float* euler) {
   if (quat == nullptr || euler == nullptr) return N3DS_NULL_ARGUMENT;
   const float w = quat[0], x = quat[1], y = quat[2], z = quat[3];
-  const double roll_sine = 2.0f * (w * x + y * z);
-  const double roll_cosine = 1.0f - 2.0f * (x * x + y * y);
-  // Not clamped: a quaternion longer than 1 near gimbal lock shows as a pitch that is not a number
-  // instead of passing for a right angle.
-  const double pitch_sine = 2.0f * (w * y - z * x);
-  const double yaw_sine = 2.0f * (w * z + x * y);
-  const double yaw_cosine = 1.0f - 2.0f * (y * y + z * z);
+  const auto roll_sine = static_cast<double>(2.0f * (w * x + y * z));
+  const auto roll_cosine = static_cast<double>(1.0f - 2.0f * (x * x + y * y));
+  // Not clamped: a quaternion longer than 1 near gimbal lock gives a NaN pitch instead of passing
+  // for a right angle.
+  const auto pitch_sine = static_cast<double>(2.0f * (w * y - z * x));
+  const auto yaw_sine = static_cast<double>(2.0f * (w * z + x * y));
+  const auto yaw_cosine = static_cast<double>(1.0f - 2.0f * (y * y + z * z));
   euler[0] = static_cast<float>(std::atan2(roll_sine, roll_cosine));
   euler[1] = static_cast<float>(std::asin(pitch_sine));
   euler[2] = static_cast<float>(std::atan2(yaw_sine, yaw_cosine));
@@ -70,7 +70,9 @@ MRESULT QuatToEuler(const float* quat, float* euler) {
 
 MRESULT EulerToQuat(const float* euler, float* quat) {
   if (euler == nullptr || quat == nullptr) return N3DS_NULL_ARGUMENT;
-  const double roll = euler[0] * 0.5f, pitch = euler[1] * 0.5f, yaw = euler[2] * 0.5f;
+  const auto roll = static_cast<double>(euler[0] * 0.5f);
+  const auto pitch = static_cast<double>(euler[1] * 0.5f);
+  const auto yaw = static_cast<double>(euler[2] * 0.5f);
   const double cr = std::cos(roll), sr = std::sin(roll);
   const double cp = std::cos(pitch), sp = std::sin(pitch);
   const double cy = std::cos(yaw), sy = std::sin(yaw);

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
-// Processor counts, and the two operations that switch offline cores on and put them back.
+// Processor counts, and the two operations that bring offline cores online and restore them.
 //
-// Both give up quietly at the first file that resists: writing takes rights an app seldom has, and
-// many kernels have no switch for core 0 at all.
+// Both stop silently at the first file that cannot be opened: apps usually lack permission, and
+// many kernels have no switch for core 0.
 #include <unistd.h>
 
 #include <algorithm>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Kernels on 8-bit pictures: halving, OR, YUYV splitting and motion masks.
+// Kernels on 8-bit images: halving, OR, YUYV splitting and motion masks.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Integral pictures in three entry widths.
+// Integral images in three entry widths.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -8,7 +8,7 @@
 
 namespace {
 
-struct Picture {
+struct Image {
   const uint8_t* pixels;
   int32_t width;
   int32_t height;
@@ -18,33 +18,33 @@ struct Picture {
 uint32_t Level(uint32_t level) { return level; }
 uint32_t Square(uint32_t level) { return level * level; }
 
-// Writes the integral of term(pixel) unless `out` is null. A pitch wider than the picture has room
-// for the leading row and column of zeros; with the bare width the entries stand without them.
+// Writes the integral of term(pixel) unless `out` is null. A pitch wider than the image has room
+// for the leading row and column of zeros; with a pitch of exactly the width there are none.
 template <typename Entry, uint32_t term(uint32_t)>
-void Integrate(const Picture& picture, Entry* out, ptrdiff_t pitch) {
-  if (out == nullptr || picture.width < 0 || picture.height < 0) return;
-  const bool leading_zeros = pitch > picture.width;
+void Integrate(const Image& image, Entry* out, ptrdiff_t pitch) {
+  if (out == nullptr || image.width < 0 || image.height < 0) return;
+  const bool leading_zeros = pitch > image.width;
   const Entry* above = nullptr;
   if (leading_zeros) {
-    std::fill_n(out, ptrdiff_t{picture.width} + 1, Entry{0});
+    std::fill_n(out, ptrdiff_t{image.width} + 1, Entry{0});
     above = out + 1;
     out += pitch;
   }
-  const uint8_t* pixels = picture.pixels;
-  for (int32_t y = 0; y < picture.height; ++y) {
+  const uint8_t* pixels = image.pixels;
+  for (int32_t y = 0; y < image.height; ++y) {
     Entry* row = out;
     if (leading_zeros) *row++ = 0;
     Entry sum = 0;
-    for (int32_t x = 0; x < picture.width; ++x) {
+    for (int32_t x = 0; x < image.width; ++x) {
       sum = static_cast<Entry>(sum + term(pixels[x]));
       row[x] = sum;
     }
     if (above != nullptr) {
-      for (int32_t x = 0; x < picture.width; ++x) row[x] = static_cast<Entry>(row[x] + above[x]);
+      for (int32_t x = 0; x < image.width; ++x) row[x] = static_cast<Entry>(row[x] + above[x]);
     }
     above = row;
     out += pitch;
-    pixels += picture.pitch;
+    pixels += image.pitch;
   }
 }
 
@@ -53,9 +53,9 @@ void Integrate(const Picture& picture, Entry* out, ptrdiff_t pitch) {
 int32_t mcvImgIntegralu8(const uint8_t* src, int32_t width, int32_t height, uint64_t* sum,
                          uint64_t* squareSum) {
   if (src == nullptr || (sum == nullptr && squareSum == nullptr)) return N3DS_NULL_ARGUMENT;
-  const Picture picture = {src, width, height, width};
-  Integrate<uint64_t, Level>(picture, sum, ptrdiff_t{width} + 1);
-  Integrate<uint64_t, Square>(picture, squareSum, ptrdiff_t{width} + 1);
+  const Image image = {src, width, height, width};
+  Integrate<uint64_t, Level>(image, sum, ptrdiff_t{width} + 1);
+  Integrate<uint64_t, Square>(image, squareSum, ptrdiff_t{width} + 1);
   return N3DS_OK;
 }
 
@@ -63,9 +63,9 @@ int32_t mcvImgIntegralu8v2(const uint8_t* src, int32_t width, int32_t height, in
                            uint32_t* sum, int32_t sumPitch, uint32_t* squareSum) {
   if (src == nullptr || (sum == nullptr && squareSum == nullptr)) return N3DS_NULL_ARGUMENT;
   if (srcPitch < width || sumPitch < width) return N3DS_BAD_VALUE;
-  const Picture picture = {src, width, height, srcPitch};
-  Integrate<uint32_t, Level>(picture, sum, sumPitch);
-  Integrate<uint32_t, Square>(picture, squareSum, sumPitch);
+  const Image image = {src, width, height, srcPitch};
+  Integrate<uint32_t, Level>(image, sum, sumPitch);
+  Integrate<uint32_t, Square>(image, squareSum, sumPitch);
   return N3DS_OK;
 }
 
@@ -77,8 +77,8 @@ int32_t mcvImgIntegralu8v3(const uint8_t* src, int32_t width, int32_t height, in
       (squareSum != nullptr && squareSumPitch < width)) {
     return N3DS_BAD_VALUE;
   }
-  const Picture picture = {src, width, height, srcPitch};
-  Integrate<uint16_t, Level>(picture, sum, sumPitch);
-  Integrate<uint32_t, Square>(picture, squareSum, squareSumPitch);
+  const Image image = {src, width, height, srcPitch};
+  Integrate<uint16_t, Level>(image, sum, sumPitch);
+  Integrate<uint32_t, Square>(image, squareSum, squareSumPitch);
   return N3DS_OK;
 }

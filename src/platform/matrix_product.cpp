@@ -144,20 +144,20 @@ N3DS_PRODUCT_INLINE void RowPointers(const float* A, int32_t rows, int32_t k, co
 template <int kRows, int kBlocks>
 N3DS_PRODUCT_CODE void MultiplyTile(float* C, const float* A, const float* B, int32_t rows,
                                     int32_t k, int32_t n, int32_t j) {
-  ptrdiff_t column[kBlocks];
+  ptrdiff_t column[size_t{kBlocks}];
   N3DS_UNROLL
   for (int b = 0; b < kBlocks; ++b) column[b] = std::min(j + b * kLanes, n - kLanes);
-  const float* row[kRows];
+  const float* row[size_t{kRows}];
   RowPointers<kRows>(A, rows, k, row);
 
-  Lanes sum[kRows][kBlocks];
+  Lanes sum[size_t{kRows}][size_t{kBlocks}];
   N3DS_UNROLL
   for (int r = 0; r < kRows; ++r) {
     N3DS_UNROLL
     for (int b = 0; b < kBlocks; ++b) sum[r][b] = Zero();
   }
   for (ptrdiff_t p = 0; p < k; ++p) {
-    Lanes factor[kBlocks];
+    Lanes factor[size_t{kBlocks}];
     N3DS_UNROLL
     for (int b = 0; b < kBlocks; ++b) factor[b] = Load(B + column[b]);
     N3DS_UNROLL
@@ -205,10 +205,10 @@ N3DS_PRODUCT_CODE void MultiplyNarrowTile(float* C, const float* A, const float*
 template <int kGroups>
 N3DS_PRODUCT_CODE void MultiplyColumnTile(float* C, const float* A, const float* B, int32_t rows,
                                           int32_t k) {
-  const float* row[kGroups * kLanes];
+  const float* row[size_t{kGroups * kLanes}];
   RowPointers<kGroups * kLanes>(A, rows, k, row);
 
-  Lanes sum[kGroups];
+  Lanes sum[size_t{kGroups}];
   N3DS_UNROLL
   for (int g = 0; g < kGroups; ++g) sum[g] = Zero();
   ptrdiff_t p = 0;
@@ -221,7 +221,7 @@ N3DS_PRODUCT_CODE void MultiplyColumnTile(float* C, const float* A, const float*
       for (int t = 0; t < 4; ++t) sum[g] = MultiplyAdd(a[t], Broadcast(B + p + t), sum[g]);
     }
   }
-  float entries[kGroups * kLanes];
+  float entries[size_t{kGroups * kLanes}];
   for (; p < k; ++p) {
     N3DS_UNROLL
     for (int r = 0; r < kGroups * kLanes; ++r) entries[r] = row[r][p];

@@ -3,8 +3,8 @@
 //
 // A pool is a row of blocks, each a header followed by its payload; the next header starts where
 // the payload ends. The chain closes with a bare header whose size has all bits set. Two free
-// blocks never stand side by side: every operation that frees bytes joins them with free
-// neighbours.
+// blocks are never neighbours: every operation that frees bytes joins them with the free blocks
+// next to them.
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
@@ -23,8 +23,8 @@ static_assert(sizeof(BlockHeader) == 16, "headers keep payloads aligned to 8");
 constexpr uint64_t kEndOfChain = UINT64_MAX;
 constexpr uint64_t kHeaderSize = sizeof(BlockHeader);
 
-// What must be left over behind a block for the rest to become a free block of its own. Shrinking
-// asks for one byte more than allocating does, which, in steps of 8, means 40.
+// Bytes that must be left for the rest of a block to become a free block. Shrinking asks for one
+// byte more than allocating; as sizes are multiples of 8, that means 40.
 constexpr int64_t kSmallestAllocRest = 32;
 constexpr int64_t kSmallestShrinkRest = 33;
 
@@ -78,7 +78,7 @@ MHandle MMemMgrCreate(void* area, size_t length) {
   if (area == nullptr) return nullptr;
   const uintptr_t address = reinterpret_cast<uintptr_t>(area);
   if (length > UINTPTR_MAX - address) return nullptr;  // would end beyond the last address
-  const size_t skipped = static_cast<size_t>(-address & 7);
+  const size_t skipped = -address & 7;
   if (length < skipped) return nullptr;
   const uint64_t usable = (length - skipped) & ~uint64_t{7};
   if (usable <= 2 * kHeaderSize) return nullptr;

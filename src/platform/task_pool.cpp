@@ -52,7 +52,7 @@ void* WorkerLoop(void* argument) {
 }
 
 // Removes `id` from the finished ring if it is there. Ids in front of it move behind the others, in
-// order: the ring turns, so the id a caller asks for next is usually the oldest.
+// order: the ring rotates, so the id a caller asks for next is usually the oldest.
 bool TakeFinished(TaskPool* pool, int32_t id) {
   const uint32_t count = pool->doneCount;
   for (uint32_t i = 0; i < count; ++i) {
@@ -161,7 +161,8 @@ int32_t mcvAddTask(void* pool, mcvTaskFunction function, void* argument) {
   context->tasks[(context->taskHead + context->taskCount) % kTaskRingSize] = {function, argument,
                                                                               id};
   ++context->taskCount;
-  // Under the lock: after it the task may run, and what it sets off may shut the pool down.
+  // Under the lock: once it is released the task may run, and what that sets off may shut the pool
+  // down.
   pthread_cond_broadcast(&context->taskReady);
   pthread_mutex_unlock(&context->queueLock);
   return id;
