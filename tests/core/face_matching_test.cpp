@@ -9,9 +9,6 @@
 #include <memory>
 #include <vector>
 
-#include "core/matching_reference.h"
-#include "support/test_random.h"
-
 namespace n3ds::testing {
 namespace {
 
@@ -137,26 +134,6 @@ TEST(AssignFaces, DistancesWrapIn32Bits) {
   // Differences wrap too: from one end of the range to the other is one step.
   EXPECT_THAT(AssignPlaces({INT32_MAX - 1, INT32_MIN}, {INT32_MAX}), ElementsAre(0, -1));
   EXPECT_THAT(AssignPlaces({INT32_MAX - 2, INT32_MIN}, {INT32_MAX}), ElementsAre(-1, 0));
-}
-
-TEST(AssignFaces, MatchesTheStraightforwardVersionOnRandomFrames) {
-  Random random = TestRandom();
-  for (int trial = 0; trial < 5000; trial++) {
-    const auto face_count = static_cast<size_t>(random.Int(1, 5));
-    const auto previous_count = static_cast<size_t>(random.Int(0, 5));
-    const int32_t size = 1 << random.Int(1, 10);  // small ones for ties
-    std::vector<int32_t> faces, previous;
-    for (size_t k = 0; k < kSlotCount; k++) {
-      const int32_t x = random.Int(0, size), y = random.Int(0, size);
-      for (uint32_t i = 0; i < 2 * kLandmarks; i++) {
-        faces.push_back((i % 2 == 0 ? x : y) + random.Int(0, 1));
-        previous.push_back(random.Int(0, size));
-      }
-    }
-    ASSERT_EQ(Assign(faces, face_count, previous, previous_count),
-              ReferenceAssignment(faces, face_count, previous, previous_count, kLandmarks))
-        << trial;
-  }
 }
 
 // A context of which every byte of every slot is known.

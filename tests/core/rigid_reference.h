@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 // The rigid workers written down once more, each as one list of steps, to compare with. The steps
-// that have tests of their own (fits, contour updates, weights, refits) are called, not repeated.
+// that have tests of their own (fits, contour updates, weights, smoothing, refits) are called, not
+// repeated.
 #pragma once
 
 #include <algorithm>
@@ -10,73 +11,18 @@
 #include <vector>
 
 #include "core/contour_correspondence.h"
+#include "core/landmark_motion.h"
 #include "core/model_tables.h"
 #include "core/output_matrices.h"
 #include "core/pose_fitting.h"
 #include "core/pose_weights.h"
+#include "core/rigid_pose_smoothing.h"
 #include "core/rigid_shape_refinement.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
 #include "support/face_scene.h"
 
 namespace n3ds::testing {
-
-// Smoothed pose; `width` is the outline's.
-inline std::vector<float> ReferencePoseSmoothing(const float* before,
-                                                 const std::vector<float>& fitted,
-                                                 const std::vector<int32_t>& now,
-                                                 const std::vector<int32_t>& previous,
-                                                 float width) {
-  const auto moves = [&](const std::vector<int>& points) {
-    float x = 0, y = 0;
-    for (const int k : points) {
-      const auto i = static_cast<size_t>(2 * k);
-      x += static_cast<float>(now[i] - previous[i]);
-      y += static_cast<float>(now[i + 1] - previous[i + 1]);
-    }
-    return std::fabs(x) + std::fabs(y);
-  };
-  std::vector<int> lower;
-  for (int k = 3; k <= 15; k++) lower.push_back(k);
-  for (int k = 75; k <= 94; k++) lower.push_back(k);
-  const float eyes = moves({39, 45, 51, 57});
-  const float g = moves(lower) * 800 / (width * 33);
-  float f = 1;
-  if (std::fabs(static_cast<double>(g)) > 1e-6 && g < 2.0f) {
-    const float h = eyes * 800 / (width * 4) / g;
-    if (h > 10) {
-      f = 2;
-    } else if (h > 2) {
-      f = 0.75f + 0.125f * h;
-    }
-  }
-  const float turn = std::fabs(fitted[0] - before[0]) + std::fabs(fitted[1] - before[1]) +
-                     std::fabs(fitted[2] - before[2]) + std::fabs(fitted[3] - before[3]);
-  const float d = 100 * turn + std::fabs(fitted[4] - before[4]) + std::fabs(fitted[5] - before[5]) +
-                  std::fabs(fitted[6] - before[6]);
-  float a = 0.2f;
-  if (d < 12) a = static_cast<float>(0.8 - 0.05 * static_cast<double>(d));
-  const float b = f * a;
-  float old_t = b, new_t = 1 - b, e;
-  if (static_cast<double>(b) > 0.8) {
-    old_t = 0.8f;
-    new_t = 0.19999999f;
-    e = 0.96f;
-  } else {
-    e = static_cast<float>(1.2 * static_cast<double>(b));
-  }
-  float old_q = e, new_q = 1 - e;
-  if (static_cast<double>(e) > 0.95) {
-    old_q = 0.95f;
-    new_q = 0.050000012f;
-  }
-  std::vector<float> pose;
-  for (size_t i = 0; i < 7; i++) {
-    pose.push_back(i < 4 ? old_q * before[i] + new_q * fitted[i]
-                         : old_t * before[i] + new_t * fitted[i]);
-  }
-  return pose;
-}
 
 // One face on its way through the rigid workers.
 class ReferenceRigidFace {
@@ -119,34 +65,18 @@ class ReferenceRigidFace {
       return;
     }
 
-    const float dx = static_cast<float>(now[0] - now[36]);
-    const float dy = static_cast<float>(now[1] - now[37]);
-    const float width = std::sqrt(dx * dx + dy * dy);
-    float sx = 0, sy = 0;
-    for (const size_t k : {45, 51, 63, 64, 68, 69, 73, 74}) {
-      sx += static_cast<float>(now[2 * k] - previous[2 * k]);
-      sy += static_cast<float>(now[2 * k + 1] - previous[2 * k + 1]);
-    }
-    const float m = (std::fabs(sx) + std::fabs(sy)) * 100 / width;
+    const float width = OutlineWidth(now.data());
+    const float m = SteadyPointMotion(now.data(), previous.data(), width);
     if (m > 100) {
       events->taken_unsmoothed++;
     } else {
-      float a = 0.1f, b = 0.9f;
-      if (m < 24) {
-        a = static_cast<float>(0.7 - 0.025 * static_cast<double>(m));
-        b = 1 - a;
-      }
-      for (size_t i = 0; i < 190; i++) {
-        const float kept = a * static_cast<float>(previous[i]);
-        const float taken = b * static_cast<float>(now[i]);
-        now[i] = static_cast<int32_t>(kept + taken);
-      }
+      BlendLandmarks(SmoothingWeights(m, 0.025, 24), previous.data(), now.data());
     }
 
     const std::vector<float> before = pose;
     FitTracked(camera, now, {1, weights.contour, weights.range, w3},
                {0, weights.contour, weights.range, w3}, events);
-    pose = ReferencePoseSmoothing(before.data(), pose, now, previous, width);
+    SmoothPose(before.data(), MotionFactor(now.data(), previous.data(), width), pose.data());
     QuatToRotationMatrix(pose.data(), rotation_);
     std::copy_n(&pose[4], 3, translation_);
 

@@ -8,7 +8,7 @@
 #include <memory>
 #include <vector>
 
-#include "core/matching_reference.h"
+#include "core/face_matching.h"
 #include "core/rigid_reference.h"
 #include "core/tracking_context.h"
 #include "norvale_3d_sticker_core.h"
@@ -354,8 +354,12 @@ class ReferenceTracker {
     for (const Points& points : *frame) now.insert(now.end(), points.begin(), points.end());
     const size_t stride = (*frame)[0].size();
     history_.resize(5 * stride, 0);
-    const std::vector<int32_t> assigned =
-        ReferenceAssignment(now, count, history_, faces_count_, stride / 2);
+    FaceAssignment assignment;
+    EXPECT_EQ(AssignFaces(now.data(), static_cast<uint32_t>(count), history_.data(),
+                          static_cast<uint32_t>(faces_count_), static_cast<uint32_t>(stride / 2),
+                          &assignment),
+              N3DS_OK);
+    const int32_t* assigned = assignment.previous;
 
     const std::vector<ReferenceRigidFace> before = faces_;
     std::vector<Points> previous(count, Points(stride, 0));
