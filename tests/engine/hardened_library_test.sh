@@ -31,8 +31,8 @@ $open"
 case "$("$readelf" -hW "$library")" in
   *AArch64*)
     code=$("$objdump" -d "$library")
-    [ "$(grep -c paciasp <<<"$code")" -ge 100 ] || complain "return addresses are not signed"
-    [ "$(grep -cE '\sbti\s' <<<"$code")" -ge 10 ] || complain "no branch target marks"
+    [ "$(grep -c paciasp <<<"$code")" -ge 50 ] || complain "return addresses are not signed"
+    [ "$(grep -cE "\sbti\s" <<<"$code")" -ge 50 ] || complain "no branch target marks"
     ;;
   *X86-64*)
     [ "$("$objdump" -d "$library" | grep -c endbr64)" -ge 100 ] || complain "no branch target marks"
