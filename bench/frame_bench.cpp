@@ -78,6 +78,8 @@ void MaskFrame(benchmark::State& state) {
 }
 BENCHMARK(MaskFrame)->Apply(WithWorkers);
 
+void* DoNothing(void*) { return nullptr; }
+
 // The life of a frame's pool, a task for each face that does nothing.
 void Pool(benchmark::State& state) {
   const auto face_count = static_cast<int32_t>(state.range(0));
@@ -85,8 +87,7 @@ void Pool(benchmark::State& state) {
     void* pool = mcvParallelInit(nullptr, static_cast<uint32_t>(face_count));
     int32_t ids[N3DS_MAX_FACES];
     for (int32_t i = 0; i < face_count; i++) {
-      ids[i] = mcvAddTask(
-          pool, [](void*) -> void* { return nullptr; }, nullptr);
+      ids[i] = mcvAddTask(pool, DoNothing, nullptr);
     }
     for (int32_t i = 0; i < face_count; i++) {
       if (mcvWaitTask(pool, ids[i]) != 0) state.SkipWithError("task failed");

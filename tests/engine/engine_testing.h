@@ -85,8 +85,9 @@ class RigidOutput {
       if (std::memcmp(&record_.faces[i], &before_.faces[i], sizeof(record_.faces[i])) != 0) {
         return false;
       }
-      if (i < buffers_.size() && !std::all_of(buffers_[i].get(), buffers_[i].get() + size_,
-                                              [](float c) { return c == kUntouched; })) {
+      if (i >= buffers_.size()) continue;
+      const float* buffer = buffers_[i].get();
+      if (std::count(buffer, buffer + size_, kUntouched) != static_cast<std::ptrdiff_t>(size_)) {
         return false;
       }
     }

@@ -69,7 +69,7 @@ TEST(AtomicFile, KeepsTheModeOfAFileAndHonoursTheMaskOfANewOne) {
   }
   umask(before);
   const auto mode = [&](const char* name) {
-    struct stat status {};
+    struct stat status = {};
     stat(folder.Path(name).c_str(), &status);
     return status.st_mode & 0777;
   };

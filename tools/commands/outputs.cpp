@@ -70,8 +70,8 @@ void WriteImage(const std::string& path, OutputFormat format, const Image& image
 }
 
 std::FILE* ConsoleBeside(const std::string& output) {
-  struct stat named {};
-  struct stat standard {};
+  struct stat named = {};
+  struct stat standard = {};
   // On a terminal both may appear.
   const bool is_same = stat(output.c_str(), &named) == 0 && fstat(STDOUT_FILENO, &standard) == 0 &&
                        !S_ISCHR(standard.st_mode) && named.st_dev == standard.st_dev &&
@@ -80,11 +80,11 @@ std::FILE* ConsoleBeside(const std::string& output) {
 }
 
 void CheckIsNoInput(const std::string& output, const std::vector<std::string>& inputs) {
-  struct stat written {};
+  struct stat written = {};
   // Reading and writing the same terminal or pipe is no harm.
   if (stat(output.c_str(), &written) != 0 || !S_ISREG(written.st_mode)) return;
   for (const std::string& input : inputs) {
-    struct stat read {};
+    struct stat read = {};
     const char* path = input == "-" ? "/dev/stdin" : input.c_str();
     if (stat(path, &read) == 0 && read.st_dev == written.st_dev && read.st_ino == written.st_ino) {
       throw UsageError(output + ": is also an input (" + input + ") and would be replaced");

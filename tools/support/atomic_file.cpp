@@ -27,7 +27,7 @@ namespace fs = std::filesystem;
 struct Target {
   std::string path;
   std::optional<int> descriptor;  // the path is a name of this open descriptor
-  struct stat status {};
+  struct stat status = {};
   bool exists = false;
 
   bool is_regular() const { return !descriptor && (!exists || S_ISREG(status.st_mode)); }

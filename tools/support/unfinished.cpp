@@ -69,7 +69,7 @@ void Unfinished::Keep() { entry_->pending = false; }
 
 void RemoveUnfinishedOnSignals() {
   for (const int number : kSignals) {
-    struct sigaction action {};
+    struct sigaction action = {};
     sigaction(number, nullptr, &action);
     if (action.sa_handler == SIG_IGN) continue;
     action = {};
