@@ -29,6 +29,8 @@ MAKERS = {
               "data", MODEL),
     "assets": ([("assets/make_sticker_assets.py", "--out"),
                 ("assets/make_mask_textures.py", "--out")], "examples/assets", ASSETS),
+    "outline": ([("make_outline_rows.py", "--out")], "data",
+                ["outline_rows.inc", "outline_normals.inc"]),
 }
 
 
