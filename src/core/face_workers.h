@@ -35,6 +35,8 @@ struct RigidFaceTask {
   const int16_t* expressionBasis;
   const int16_t* tensor;
   int32_t* trackFlag;
+  uint32_t refitLimit;  // repeats of a failed fit before it is given up; 0: without a limit
+  int32_t* fitGivenUp;  // receives 1 if it was, else 0
 };
 
 struct MaskFaceTask {

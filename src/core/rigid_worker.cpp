@@ -37,36 +37,61 @@ class ShiftedLandmarks {
   int32_t landmarks_[2 * kFitLandmarkCount];
 };
 
-// Retries have no bound: a worker has no way to report a failure, and the outputs of a face without
-// a pose would be worthless.
-void FitTrackedFace(const int32_t* landmarks, const FitWeights& first_weights,
-                    const FitWeights& retry_weights, PoseRounds* rounds) {
-  bool fitted = rounds->Fit(landmarks, rounds->contour(), first_weights);
-  if (fitted) {
-    rounds->UpdateContour(landmarks);
-    return;
+// Counts the repeats of a failed fit. Without a limit they never end: the outputs of a face without
+// a pose would be worthless to a host that has not asked to be told.
+class Repeats {
+ public:
+  explicit Repeats(uint32_t limit) : limit_(limit) {}
+  bool Next() {
+    if (limit_ == 0) return true;
+    if (done_ == limit_) return false;
+    ++done_;
+    return true;
   }
-  ShiftedLandmarks shifted(landmarks);
-  while (!fitted) {
+
+ private:
+  uint32_t limit_;
+  uint32_t done_ = 0;
+};
+
+// False when the fit was given up: the pose is the last one then.
+bool FitTrackedFace(const RigidFaceTask& task, const FitWeights& first_weights,
+                    const FitWeights& retry_weights, PoseRounds* rounds) {
+  bool fitted = rounds->Fit(task.landmarks, rounds->contour(), first_weights);
+  if (fitted) {
+    rounds->UpdateContour(task.landmarks);
+    return true;
+  }
+  ShiftedLandmarks shifted(task.landmarks);
+  Repeats repeats(task.refitLimit);
+  while (!fitted && repeats.Next()) {
     const int32_t* moved = shifted.Shift();
     fitted = rounds->Fit(moved, rounds->contour(), retry_weights);
     if (fitted) rounds->UpdateContour(moved);
   }
+  return fitted;
 }
 
-void FitNewFace(const int32_t* landmarks, const FitWeights& weights, PoseRounds* rounds) {
+// False when the fit was given up: the pose is the start pose then.
+bool FitNewFace(const RigidFaceTask& task, const FitWeights& weights, PoseRounds* rounds) {
   rounds->StartNewFace();
-  bool fitted = rounds->Fit(landmarks, kDefaultContourVertexIndices, weights);
+  bool fitted = rounds->Fit(task.landmarks, kDefaultContourVertexIndices, weights);
   const auto run_rounds = [&](const int32_t* points) {
     for (int i = 0; i < kNewFaceRounds; ++i) {
       if (fitted) rounds->UpdateContour(points);
       fitted = rounds->Fit(points, rounds->contour(), weights);
     }
   };
-  run_rounds(landmarks);
-  ShiftedLandmarks shifted(landmarks);
-  while (!fitted) run_rounds(shifted.Shift());
-  rounds->UpdateContour(landmarks);
+  run_rounds(task.landmarks);
+  ShiftedLandmarks shifted(task.landmarks);
+  Repeats repeats(task.refitLimit);
+  while (!fitted && repeats.Next()) run_rounds(shifted.Shift());
+  if (!fitted) {
+    rounds->StartNewFace();
+    return false;
+  }
+  rounds->UpdateContour(task.landmarks);
+  return true;
 }
 
 // What both workers leave behind for the output stage and the next frame.
@@ -106,24 +131,28 @@ void* _Build3DFaceForVideo_Rigid_Thread(void* argument) {
   const FitWeights plain = {0, weights.contour, weights.range, inner};
   PoseRounds rounds(task.memory, task.meanShapeF, task.camera, task.pose, task.fitState);
 
+  bool fitted;
   if (*task.trackFlag == 0) {
-    FitNewFace(task.landmarks, plain, &rounds);
+    fitted = FitNewFace(task, plain, &rounds);
     std::memset(task.identityCoef, 0, kIdentityCount * sizeof(float));
     std::memset(task.expressionCoef, 0, kExpressionCount * sizeof(float));
-    *task.trackFlag = 1;
+    if (fitted) *task.trackFlag = 1;
   } else {
     const float outline_width = OutlineWidth(task.landmarks);
     SmoothLandmarks(task, outline_width);
     float previous_pose[kPoseSize];
     std::memcpy(previous_pose, task.pose, sizeof(previous_pose));
     const FitWeights weighted = {1, weights.contour, weights.range, inner};
-    FitTrackedFace(task.landmarks, weighted, plain, &rounds);
-    SmoothPose(previous_pose, MotionFactor(task.landmarks, task.prevLandmarks, outline_width),
-               task.pose);
-    rounds.UpdateTransformFromPose();
-    RefineShape(task, weights, rounds);
+    fitted = FitTrackedFace(task, weighted, plain, &rounds);
+    if (fitted) {
+      SmoothPose(previous_pose, MotionFactor(task.landmarks, task.prevLandmarks, outline_width),
+                 task.pose);
+      rounds.UpdateTransformFromPose();
+      RefineShape(task, weights, rounds);
+    }
     *task.trackFlag = WrapAdd(*task.trackFlag, 1);
   }
+  *task.fitGivenUp = fitted ? 0 : 1;
   FinishFace(task, rounds);
   return nullptr;
 }
@@ -136,12 +165,14 @@ void* _Build3DFaceForVideo_Rigid_Thread_Acce(void* argument) {
   const FitWeights plain = {0, weights.contour, weights.range, 1.0f};
   PoseRounds rounds(task.memory, task.meanShapeF, task.camera, task.pose, task.fitState);
 
+  bool fitted;
   if (*task.trackFlag == 0) {
-    FitNewFace(task.landmarks, plain, &rounds);
-    *task.trackFlag = 1;
+    fitted = FitNewFace(task, plain, &rounds);
+    if (fitted) *task.trackFlag = 1;
   } else {
-    FitTrackedFace(task.landmarks, plain, plain, &rounds);
+    fitted = FitTrackedFace(task, plain, plain, &rounds);
   }
+  *task.fitGivenUp = fitted ? 0 : 1;
   FinishFace(task, rounds);
   return nullptr;
 }

@@ -35,6 +35,10 @@ struct TrackingContext {
   uint64_t trackState[kSlotCount][80];  // reserved
   int32_t trackFlag[kSlotCount];        // 0: new face; otherwise tracked
   uint32_t faceNum;                     // faces in the last frame
+  float focalLength;                    // pixels; 0: assumed from the image's size
+  uint32_t refitLimit;                  // repeats of a failed rigid fit; 0: without a limit
+  int32_t previousSlot[kSlotCount];     // slot each face had in the frame before; -1: new
+  int32_t fitGivenUp[kSlotCount];       // rigid mode: 1 if the face's fit was given up
 };
 
 inline TrackingContext* ContextOf(void* core) { return static_cast<TrackingContext*>(core); }

@@ -25,17 +25,6 @@ struct Frame {
   const int32_t* previous_landmarks;  // face k's from 2 * landmarkNum * k on
 };
 
-MRESULT CheckFrame(const TrackingContext& context, const N3DS_LANDMARK* faces, int32_t face_count) {
-  if (faces == nullptr || !HasModel(context)) return N3DS_NULL_ARGUMENT;
-  for (int32_t k = 0; k < face_count; ++k) {
-    if (faces[k].points == nullptr) return N3DS_NULL_ARGUMENT;
-    const uint32_t count = faces[k].count;
-    if (count != N3DS_LANDMARKS_101 && count != N3DS_LANDMARKS_165) return N3DS_BAD_VALUE;
-    if (count != faces[0].count) return N3DS_BAD_VALUE;
-  }
-  return N3DS_OK;
-}
-
 void ResetTracks(TrackingContext* context) {
   context->faceNum = 0;
   std::memset(context->identityCoef, 0, sizeof(context->identityCoef));
@@ -47,17 +36,6 @@ void ResetTracks(TrackingContext* context) {
 // Coordinates of kSlotCount faces with the latched number of landmarks.
 size_t HistorySize(const TrackingContext& context) {
   return 2 * static_cast<size_t>(kSlotCount) * context.landmarkNum;
-}
-
-// Latches the landmark count of the first frame with a face, and allocates the history for it.
-MRESULT PrepareHistory(TrackingContext* context, uint32_t landmark_count) {
-  if (context->landmarkNum == 0) context->landmarkNum = landmark_count;
-  if (context->landmarkHistory != nullptr) return N3DS_OK;
-  const size_t bytes = HistorySize(*context) * sizeof(int32_t);
-  context->landmarkHistory = static_cast<int32_t*>(MMemAlloc(context->memory, bytes));
-  if (context->landmarkHistory == nullptr) return N3DS_NO_MEMORY;
-  MMemSet(context->landmarkHistory, 0, bytes);
-  return N3DS_OK;
 }
 
 // The frame's landmarks as landmark_num pairs a face: a frame of another count is cut or filled with
@@ -72,20 +50,11 @@ void CollectLandmarks(const N3DS_LANDMARK* faces, uint32_t face_count, uint32_t 
   }
 }
 
-// A pinhole camera in the middle of the image with a focal length between width and height: close
-// enough for phones. A wrong focal length shows mostly as a wrong distance; a factor of 0.8 or 1.4
-// turns the head by 2 to 3 degrees as well.
-void SetCamera(const NSVL_OFFSCREEN& image, float* camera) {
-  const auto width = static_cast<float>(image.width);
-  const auto height = static_cast<float>(image.height);
-  const float focal = (width + height) / 2.0f;
-  const float matrix[9] = {focal, 0, width / 2.0f, 0, focal, height / 2.0f, 0, 0, 1};
-  std::memcpy(camera, matrix, sizeof(matrix));
-}
-
 void FillOwn(TrackingContext* context, uint32_t k, RigidFaceTask* task) {
   task->trackState = context->trackState[k];
   task->contourState = context->contourState[k];
+  task->refitLimit = context->refitLimit;
+  task->fitGivenUp = &context->fitGivenUp[k];
 }
 
 void FillOwn(TrackingContext* context, uint32_t k, MaskFaceTask* task) {
@@ -151,15 +120,12 @@ MRESULT RunWorkers(TrackingContext* context, const Frame& frame, mcvTaskFunction
 template <typename Task>
 MRESULT BuildFaces(TrackingContext* context, const NSVL_OFFSCREEN& image, N3DS_LANDMARK* faces,
                    int32_t nFaces, mcvTaskFunction worker) {
-  if (image.width < 1 || image.height < 1 || nFaces < 0 || nFaces > N3DS_MAX_FACES) {
-    return N3DS_BAD_VALUE;
-  }
+  MRESULT result = CheckFrame(*context, image, faces, nFaces);
+  if (result != N3DS_OK) return result;
   if (nFaces == 0) {
     ResetTracks(context);
     return N3DS_OK;
   }
-  MRESULT result = CheckFrame(*context, faces, nFaces);
-  if (result != N3DS_OK) return result;
   result = PrepareHistory(context, faces[0].count);
   if (result != N3DS_OK) return result;
 
@@ -174,7 +140,7 @@ MRESULT BuildFaces(TrackingContext* context, const NSVL_OFFSCREEN& image, N3DS_L
   for (size_t i = 0; i < kShapeSize; ++i) {
     mean_shape[i] = static_cast<float>(context->meanShape[i]) * kModelUnit;
   }
-  SetCamera(image, context->camera);
+  SetCamera(image, context->focalLength, context->camera);
 
   FaceAssignment assignment;
   result = AssignFaces(landmarks.get(), face_count, previous.get(), context->faceNum,
@@ -184,12 +150,50 @@ MRESULT BuildFaces(TrackingContext* context, const NSVL_OFFSCREEN& image, N3DS_L
   if (result != N3DS_OK) return result;
   MMemCpy(context->landmarkHistory, landmarks.get(), history_size * sizeof(int32_t));
   context->faceNum = face_count;
+  std::memcpy(context->previousSlot, assignment.previous, sizeof(context->previousSlot));
 
   const Frame frame = {image, faces, face_count, mean_shape.get(), previous.get()};
   return RunWorkers<Task>(context, frame, worker);
 }
 
 }  // namespace
+
+MRESULT CheckFrame(const TrackingContext& context, const NSVL_OFFSCREEN& image,
+                   const N3DS_LANDMARK* faces, int32_t face_count) {
+  if (image.width < 1 || image.height < 1 || face_count < 0 || face_count > N3DS_MAX_FACES) {
+    return N3DS_BAD_VALUE;
+  }
+  if (face_count == 0) return N3DS_OK;
+  if (faces == nullptr || !HasModel(context)) return N3DS_NULL_ARGUMENT;
+  for (int32_t k = 0; k < face_count; ++k) {
+    if (faces[k].points == nullptr) return N3DS_NULL_ARGUMENT;
+    const uint32_t count = faces[k].count;
+    if (count != N3DS_LANDMARKS_101 && count != N3DS_LANDMARKS_165) return N3DS_BAD_VALUE;
+    if (count != faces[0].count) return N3DS_BAD_VALUE;
+  }
+  return N3DS_OK;
+}
+
+// A pinhole camera in the middle of the image with a focal length between width and height: close
+// enough for phones. A wrong focal length shows mostly as a wrong distance; a factor of 0.8 or 1.4
+// turns the head by 2 to 3 degrees as well.
+void SetCamera(const NSVL_OFFSCREEN& image, float focal_length, float* camera) {
+  const auto width = static_cast<float>(image.width);
+  const auto height = static_cast<float>(image.height);
+  const float focal = focal_length > 0 ? focal_length : (width + height) / 2.0f;
+  const float matrix[9] = {focal, 0, width / 2.0f, 0, focal, height / 2.0f, 0, 0, 1};
+  std::memcpy(camera, matrix, sizeof(matrix));
+}
+
+MRESULT PrepareHistory(TrackingContext* context, uint32_t landmark_count) {
+  if (context->landmarkNum == 0) context->landmarkNum = landmark_count;
+  if (context->landmarkHistory != nullptr) return N3DS_OK;
+  const size_t bytes = HistorySize(*context) * sizeof(int32_t);
+  context->landmarkHistory = static_cast<int32_t*>(MMemAlloc(context->memory, bytes));
+  if (context->landmarkHistory == nullptr) return N3DS_NO_MEMORY;
+  MMemSet(context->landmarkHistory, 0, bytes);
+  return N3DS_OK;
+}
 
 MRESULT BuildRigidFaces(TrackingContext* context, const NSVL_OFFSCREEN& image, N3DS_LANDMARK* faces,
                         int32_t face_count) {

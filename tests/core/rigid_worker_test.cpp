@@ -64,7 +64,9 @@ class Face {
                           Model().identityBasis,
                           Model().expressionBasis,
                           Model().tensor,
-                          &flag};
+                          &flag,
+                          refit_limit,
+                          &given_up};
     EXPECT_EQ(worker(&task), nullptr);
     return {now.get(), now.get() + 190};
   }
@@ -98,6 +100,8 @@ class Face {
   float contour_state[57] = {};
   int32_t contour[19] = {};
   int32_t flag = 0;
+  uint32_t refit_limit = 0;
+  int32_t given_up = -1;
 
  private:
   float scale_;
