@@ -5,7 +5,7 @@
 
 MRESULT CNorvaleFaceShapeImp::TrackFrame(BuildFunction build, NSVL_OFFSCREEN* image,
                                          unsigned int nFaces, unsigned int nLandmarks,
-                                         __tag_point* points, n3ds::FrameRecords* records) const {
+                                         __tag_point* points, n3ds::FrameRecords* records) {
   // Refused before any landmark is read: the core would refuse them too, but only after they were
   // copied into buffers of a fixed size.
   if (image == nullptr || nFaces > N3DS_MAX_FACES) return N3DS_FAILED;
@@ -21,7 +21,8 @@ MRESULT CNorvaleFaceShapeImp::TrackFrame(BuildFunction build, NSVL_OFFSCREEN* im
     }
     faces = records->landmarks;
   }
-  const MRESULT result = build(core, &upright, faces, static_cast<int32_t>(nFaces));
+  const MRESULT result =
+      extensions_.TrackFrame(build, core, &upright, faces, static_cast<int32_t>(nFaces));
   return result == N3DS_OK ? N3DS_OK : N3DS_FAILED;
 }
 
@@ -35,7 +36,7 @@ MRESULT CNorvaleFaceShapeImp::ProcessFace(NSVL_OFFSCREEN* image, unsigned int nF
       N3DS_OK) {
     return N3DS_FAILED;
   }
-  if (N3DS_GetRigidMatrix(core, records.matrices, static_cast<int32_t>(nFaces)) != N3DS_OK) {
+  if (extensions_.ReportRigid(core, records.matrices, static_cast<int32_t>(nFaces)) != N3DS_OK) {
     return N3DS_FAILED;
   }
   n3ds::ReportMatrices(records, nFaces, nLandmarks, out);

@@ -29,7 +29,7 @@ MRESULT CNorvaleFaceShapeImp::ProcessFaceMask(NSVL_OFFSCREEN* image, unsigned in
     return N3DS_FAILED;
   }
   N3DS_3D_MODEL meshes[N3DS_FACE_CAPACITY] = {};
-  if (N3DS_GetFace3DModel(core, meshes, records.matrices, static_cast<int32_t>(nFaces)) !=
+  if (extensions_.ReportMask(core, meshes, records.matrices, static_cast<int32_t>(nFaces)) !=
       N3DS_OK) {
     return N3DS_FAILED;
   }

@@ -85,6 +85,7 @@ MRESULT CNorvaleFaceShapeImp::FinishInitialize(MRESULT result, unsigned int new_
 }
 
 MRESULT CNorvaleFaceShapeImp::UnInitalize() {
+  extensions_.Release();
   if (core != nullptr) {
     N3DS_UnInit(core);
     core = nullptr;

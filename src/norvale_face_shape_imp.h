@@ -9,6 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "engine_extensions.h"
 #include "norvale_3d_sticker_core.h"
 
 namespace n3ds {
@@ -38,6 +39,13 @@ class CNorvaleFaceShapeImp {
                           Norvale_3DSticker_Matrix_Array* matrices,
                           Norvale_3DSticker_ModelInfo_Array* models);
 
+  // What lies beyond the frame functions; `core` is null while uninitialised.
+  n3ds::EngineExtensions& extensions() { return extensions_; }
+  MRESULT GetFaceStates(Norvale_3DSticker_Face_State* states, unsigned int state_size,
+                        unsigned int capacity, unsigned int* count) const {
+    return extensions_.GetFaceStates(core, states, state_size, capacity, count);
+  }
+
   // Maps one face's landmarks from the delivered image to the upright, unmirrored one, and
   // renumbers them when mirrored. `image` is the delivered image. Returns nonzero; 0, with nothing
   // written, when points or image are null or count is 0.
@@ -54,8 +62,7 @@ class CNorvaleFaceShapeImp {
   // First half of a frame call, the same in both modes: maps the landmarks and runs a driver.
   // Returns 0, or 1 for any failure.
   MRESULT TrackFrame(BuildFunction build, NSVL_OFFSCREEN* image, unsigned int nFaces,
-                     unsigned int nLandmarks, __tag_point* points,
-                     n3ds::FrameRecords* records) const;
+                     unsigned int nLandmarks, __tag_point* points, n3ds::FrameRecords* records);
   // Ends an initialisation: stores the orientation, or returns to the uninitialised state.
   MRESULT FinishInitialize(MRESULT result, unsigned int degree, unsigned int mirror);
 
@@ -65,6 +72,7 @@ class CNorvaleFaceShapeImp {
   // The model file's bytes; null while uninitialised. The core unpacks them into arrays of its own
   // and does not read them again; the engine keeps them for as long as it is initialised.
   uint8_t* modelBuffer = nullptr;
+  n3ds::EngineExtensions extensions_;
   float maskVertices[N3DS_FACE_CAPACITY][kMaskVertexFloats] = {};
   float maskTexCoords[kMaskTextureFloats] = {};
 };

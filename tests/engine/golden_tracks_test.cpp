@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
-// Both modes give the same bits on every machine, with every compiler and at every optimisation
-// level: hashes of all outputs of whole tracks, generated ones and the example tracks.
+// Both modes of both trackers give the same bits on every machine, with every compiler and at every
+// optimisation level: hashes of all outputs of whole tracks, generated ones and the example tracks.
 //
 // A change of these values is a change of results, of the face model or of a track, and needs a
 // reason. To renew them, and those of single steps:
@@ -22,6 +22,7 @@
 #include <vector>
 
 #include "engine/engine_testing.h"
+#include "norvale_3d_sticker_extensions.h"
 #include "support/golden.h"
 #include "tracks/track_file.h"
 
@@ -159,9 +160,19 @@ std::vector<float> LandmarksOf(const RigidOutput& out) {
   return all;
 }
 
+std::unique_ptr<Engine> ReadyFor(const Track& track, uint32_t tracker) {
+  auto engine = Engine::Ready(track.degree, track.mirror);
+  Norvale_3DSticker_Options options = {};
+  options.size = sizeof(options);
+  EXPECT_EQ(Norvale_3DSticker_GetOptions(engine->handle(), &options), N3DS_OK);
+  options.tracker = tracker;
+  EXPECT_EQ(Norvale_3DSticker_SetOptions(engine->handle(), &options), N3DS_OK);
+  return engine;
+}
+
 // All matrices and 3-D landmarks.
-void RunRigid(const Track& track, Results* results) {
-  const auto engine = Engine::Ready(track.degree, track.mirror);
+void RunRigid(const Track& track, Results* results, uint32_t tracker = N3DS_TRACKER_CLASSIC) {
+  const auto engine = ReadyFor(track, tracker);
   results->frames.resize(track.frames.size());
   Hash hash;
   for (size_t frame = 0; frame < track.frames.size(); frame++) {
@@ -178,8 +189,8 @@ void RunRigid(const Track& track, Results* results) {
 }
 
 // The same and the meshes.
-void RunMask(const Track& track, Results* results) {
-  const auto engine = Engine::Ready(track.degree, track.mirror);
+void RunMask(const Track& track, Results* results, uint32_t tracker = N3DS_TRACKER_CLASSIC) {
+  const auto engine = ReadyFor(track, tracker);
   NSVL_OFFSCREEN image = ImageOf(track.width, track.height);
   Norvale_3DSticker_ModelInfo_Array models = {};
   results->frames.resize(track.frames.size());
@@ -298,7 +309,7 @@ std::vector<std::string> TrackNames() {
   std::vector<std::string> names;
   for (const Golden& golden : kGolden) {
     const std::string name = golden.name;
-    if (name.rfind("step_", 0) != 0) names.push_back(name);
+    if (name.rfind("step_", 0) != 0 && name.rfind("steady_", 0) != 0) names.push_back(name);
   }
   return names;
 }
@@ -313,6 +324,17 @@ TEST_P(GoldenTracks, EveryBitIsAsItWas) {
   const Golden found = {GetParam().c_str(), results.rigid, results.mask};
   Report(found, FramesText(GetParam(), results));
   EXPECT_EQ(found, GoldenOf(GetParam())) << Differences(ReadFrames(GetParam()), results.frames);
+}
+
+TEST_P(GoldenTracks, EveryBitOfTheSteadyTrackerIsAsItWas) {
+  const Track track = TrackOf(GetParam());
+  const std::string name = "steady_" + GetParam();
+  Results results;
+  RunRigid(track, &results, N3DS_TRACKER_STEADY);
+  RunMask(track, &results, N3DS_TRACKER_STEADY);
+  const Golden found = {name.c_str(), results.rigid, results.mask};
+  Report(found);
+  EXPECT_EQ(found, GoldenOf(name));
 }
 
 INSTANTIATE_TEST_SUITE_P(, GoldenTracks, ::testing::ValuesIn(TrackNames()),
