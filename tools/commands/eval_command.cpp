@@ -63,7 +63,8 @@ void RunEvalCommand(const EvalOptions& options) {
         if (judge) judge->AddFrame(track.header, track.frames[f], result, meshes[k]);
         progress.Step();
       };
-      poses.push_back(CameraPoses(track, RunTrack(track, model, options.engine.mode(), use)));
+      poses.push_back(CameraPoses(
+          track, RunTrack(track, model, options.engine.mode(), use, options.engine.tracker())));
     }
   }
   std::vector<JudgedTrack> judged;

@@ -16,6 +16,12 @@ const std::map<std::string, TrackMode>& ModesByName() {
   return modes;
 }
 
+const std::map<std::string, TrackerKind>& TrackersByName() {
+  static const std::map<std::string, TrackerKind> trackers = {{"classic", TrackerKind::kClassic},
+                                                              {"steady", TrackerKind::kSteady}};
+  return trackers;
+}
+
 CLI::Validator NotEmpty() {
   return {[](std::string& text) {
             return text.empty() ? std::string("the name is empty") : std::string();
@@ -26,6 +32,8 @@ CLI::Validator NotEmpty() {
 }  // namespace
 
 TrackMode EngineOptions::mode() const { return ModesByName().at(mode_name); }
+
+TrackerKind EngineOptions::tracker() const { return TrackersByName().at(tracker_name); }
 
 std::string EngineOptions::model_path() const { return model.empty() ? DefaultModelPath() : model; }
 
@@ -56,6 +64,11 @@ void AddEngineOptions(CLI::App& command, EngineOptions& options) {
             "What the engine fits: rigid (the pose of the head) or mask (its shape\n"
             "as well, as a dense mesh)",
             ModesByName(), "rigid|mask")
+      ->capture_default_str();
+  AddChoice(command, "--tracker", options.tracker_name,
+            "How the engine tracks: classic (each frame is fitted, results are smoothed)\n"
+            "or steady (one filter over pose, person and expression)",
+            TrackersByName(), "classic|steady")
       ->capture_default_str();
 }
 

@@ -17,8 +17,10 @@ namespace n3ds::tool {
 struct EngineOptions {
   std::string model;
   std::string mode_name = "rigid";
+  std::string tracker_name = "classic";
 
   TrackMode mode() const;
+  TrackerKind tracker() const;
   // The face-model file. Throws Error when none was named and none is found.
   std::string model_path() const;
 };

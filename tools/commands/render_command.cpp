@@ -175,7 +175,7 @@ class Drawing {
  private:
   // Runs the whole track, because tracking is a sequence in time, and draws the chosen frames.
   void DrawFrames(const std::function<void(const FrameResult&, const Image&)>& use) {
-    EngineSession session(model_, track_.header, options_.engine.mode());
+    EngineSession session(model_, track_.header, options_.engine.mode(), options_.engine.tracker());
     Progress progress("drawing " + track_.name, chosen_.size());
     std::size_t next = 0;
     for (std::size_t f = 0; f < track_.frames.size() && next < chosen_.size(); ++f) {

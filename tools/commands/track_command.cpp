@@ -145,7 +145,7 @@ void RunTrackCommand(const TrackOptions& options) {
   CheckIsNoInput(options.out, {options.track, model});
   TrackInput input(options.track);
   TrackReader track(input.stream(), input.name());
-  EngineSession session(model, track.header(), options.engine.mode());
+  EngineSession session(model, track.header(), options.engine.mode(), options.engine.tracker());
   std::optional<AtomicFile> out;
   if (!options.out.empty()) {
     out.emplace(options.out);

@@ -7,7 +7,7 @@
 #include <memory>
 
 #include "mesh/face_tables.h"
-#include "norvale_3d_sticker_engine.h"
+#include "norvale_3d_sticker_extensions.h"
 #include "support/error.h"
 
 namespace n3ds::tool {
@@ -31,8 +31,13 @@ std::string LoadFailure(const std::string& path, MRESULT result) {
 }  // namespace
 
 EngineSession::EngineSession(const std::string& model_path, const TrackHeader& header,
-                             TrackMode mode)
+                             TrackMode mode, TrackerKind tracker)
     : engine_(Norvale_3DSticker_CreateEngine()), header_(header), mode_(mode) {
+  Norvale_3DSticker_Options options{};
+  options.size = sizeof(options);
+  Norvale_3DSticker_GetOptions(engine_, &options);
+  options.tracker = tracker == TrackerKind::kSteady ? N3DS_TRACKER_STEADY : N3DS_TRACKER_CLASSIC;
+  Norvale_3DSticker_SetOptions(engine_, &options);
   const MRESULT result = Norvale_3DSticker_Initialize(engine_, model_path.c_str(),
                                                       static_cast<std::uint32_t>(header.degree),
                                                       static_cast<std::uint32_t>(header.mirror));
@@ -115,8 +120,9 @@ FrameResult EngineSession::Process(const TrackFrame& frame) {
 }
 
 std::vector<FrameResult> RunTrack(const Track& track, const std::string& model_path, TrackMode mode,
-                                  const std::function<void(std::size_t, const FrameResult&)>& use) {
-  EngineSession session(model_path, track.header, mode);
+                                  const std::function<void(std::size_t, const FrameResult&)>& use,
+                                  TrackerKind tracker) {
+  EngineSession session(model_path, track.header, mode, tracker);
   std::vector<FrameResult> results;
   results.reserve(track.frames.size());
   for (std::size_t f = 0; f < track.frames.size(); ++f) {

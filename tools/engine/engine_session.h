@@ -16,10 +16,14 @@ namespace n3ds::tool {
 // mask mode dense meshes as well.
 enum class TrackMode { kRigid, kMask };
 
+// Which of its trackers the engine uses.
+enum class TrackerKind { kClassic, kSteady };
+
 class EngineSession {
  public:
   // Throws Error when the model cannot be loaded.
-  EngineSession(const std::string& model_path, const TrackHeader& header, TrackMode mode);
+  EngineSession(const std::string& model_path, const TrackHeader& header, TrackMode mode,
+                TrackerKind tracker = TrackerKind::kClassic);
   ~EngineSession();
   EngineSession(const EngineSession&) = delete;
   EngineSession& operator=(const EngineSession&) = delete;
@@ -41,6 +45,7 @@ class EngineSession {
 // Meshes are dropped after it: those of a whole track would fill the memory.
 std::vector<FrameResult> RunTrack(
     const Track& track, const std::string& model_path, TrackMode mode,
-    const std::function<void(std::size_t, const FrameResult&)>& use = {});
+    const std::function<void(std::size_t, const FrameResult&)>& use = {},
+    TrackerKind tracker = TrackerKind::kClassic);
 
 }  // namespace n3ds::tool
