@@ -81,7 +81,8 @@ class Surface:
             nearer = length < distance
             distance = np.where(nearer, length, distance)
             shares = np.where(nearer[:, None], on_edge, shares)
-        best = int(np.argmin(distance))
+        # On a shared edge the first triangle, whatever the last bits say.
+        best = int(np.argmin(np.round(distance, 6)))
         return self.triangles[best], shares[best]
 
 
@@ -105,7 +106,7 @@ def row_of(landmark, surface, vertex):
     places = [surface.nearest(p) for p in line]
     on_skin = np.array([shares @ surface.points[triangle] for triangle, shares in places])
     along = np.concatenate([[0], np.cumsum(np.linalg.norm(np.diff(on_skin, axis=0), axis=1))])
-    chosen = [int(np.argmin(abs(along - s))) for s in np.linspace(0, along[-1], PLACES)]
+    chosen = [int(np.argmin(np.round(abs(along - s), 6))) for s in np.linspace(0, along[-1], PLACES)]
     out = np.array([-1.0, 0.0])
     if point[1] <= RADIAL_CENTRE[1]:
         out = point[:2] - RADIAL_CENTRE[:2]
@@ -129,7 +130,7 @@ def main():
     triangles = numbers(arguments.data / "triangles.inc").reshape(-1, 3)
     vertices = numbers(arguments.data / "default_contour_vertex_indices.inc")
     surface = Surface(points, triangles)
-    mirrored = [int(np.argmin(((points * [-1, 1, 1] - p) ** 2).sum(1))) for p in points]
+    mirrored = [int(np.argmin(np.round(((points * [-1, 1, 1] - p) ** 2).sum(1), 6))) for p in points]
 
     rows, normals = [], []
     for landmark in range(CHIN + 1):
