@@ -57,6 +57,11 @@ struct alignas(32) Face {
   float last_u[kLandmarkStride];
   float last_v[kLandmarkStride];
   double last_seen;  // s
+  // The frame before's, how far each had moved then, and for how many frames it has not moved at all.
+  float previous_u[kMeasurementStride];
+  float previous_v[kMeasurementStride];
+  float previous_motion[kMeasurementStride];
+  int still_frames[kMeasurementStride];
   uint64_t id;
   bool valid;        // false: the state is of no use
   float confidence;  // 0 to 1

@@ -121,9 +121,9 @@ bool NoticeChange(const Tools& tools, const Observation& seen, const TimeStep& t
   int inner = 0;
   int untrusted = 0;
   for (int i = kOutlineLandmarkCount; i < kLandmarkCount; i++) {
-    if (!(seen.active[i] > 0)) continue;
+    if (tools.model.has_offset[i] == 0) continue;  // not measured
     inner++;
-    if (tools.work->weight[i] < kTrusted) untrusted++;
+    if (!(seen.active[i] > 0) || tools.work->weight[i] < kTrusted) untrusted++;
   }
   if (static_cast<float>(untrusted) > kOccluded * static_cast<float>(inner)) {
     face->bad_frames = 0;

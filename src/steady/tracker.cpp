@@ -6,6 +6,7 @@
 #include <cstring>
 #include <thread>
 
+#include "steady/frozen.h"
 #include "steady/tuning.h"
 
 namespace n3ds::steady {
@@ -139,7 +140,9 @@ bool Tracker::UpdateOne(int slot) {
   Face* const face = live_[slot];
   const Tools tools = ToolsOf(slot);
   Bench& bench = bench_[slot];
-  const Observation& seen = seen_[slot];
+  Observation& seen = seen_[slot];
+  seen.count = LeaveOutFrozen(seen, face, landmarks_[slot].active);
+  seen.active = landmarks_[slot].active;
   if (!face->valid) {
     ShowUnexplained(tools, face);
     return false;

@@ -54,6 +54,7 @@ class Tracker {
   struct alignas(32) Landmarks {
     float u[kMeasurementStride];
     float v[kMeasurementStride];
+    float active[kMeasurementStride];  // of a tracked face
   };
   struct Task {
     Tracker* tracker;

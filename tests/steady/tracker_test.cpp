@@ -198,6 +198,30 @@ TEST(SteadyTracker, AHandOverTheMouthDoesNotMoveTheHead) {
   }
 }
 
+// Half of the landmarks stay where they were seen last while the head turns on.
+TEST(SteadyTracker, LandmarksThatStayBehindDoNotHoldTheHead) {
+  Host clean;
+  Host hidden;
+  std::vector<int32_t> held;
+  for (int frame = 0; frame < 120; frame++) {
+    std::vector<int32_t> landmarks = Moving(7, frame);
+    clean.Frame({landmarks});
+    if (frame == 44) held = landmarks;
+    if (frame >= 45 && frame < 75) {
+      for (size_t i = 0; i < 101; i++) {
+        const bool left = held[2 * i] < held[2 * 98];  // of the nose's ridge
+        if (!left) continue;
+        landmarks[2 * i] = held[2 * i];
+        landmarks[2 * i + 1] = held[2 * i + 1];
+      }
+    }
+    hidden.Frame({landmarks});
+    const double off = DegreesBetween(clean.face().mean.rotation.m, hidden.face().mean.rotation.m);
+    EXPECT_LT(off, frame < 90 ? 2 : 0.4) << frame;
+    EXPECT_EQ(hidden.id(), 1u);
+  }
+}
+
 TEST(SteadyTracker, KeepsTheLastGoodPoseWhileNothingFits) {
   Host run;
   Random random = TestRandom();
