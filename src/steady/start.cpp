@@ -118,54 +118,43 @@ bool IsPlausible(const StateMean& mean) {
   return std::isfinite(mean.place[2]) && std::isfinite(mean.rotation.m[0]);
 }
 
-// Damped Gauss-Newton steps, the first two for the pose alone. Keeps the last normal equations in
-// the workspace. Returns the robust cost, and for a stranger that of the identity.
-float FitSteps(const Tools& tools, const Observation& seen, const KnownPerson* known, int steps,
-               bool to_the_end, Face* face) {
+// Fills the workspace's normal equations at the face, and their right side x, for step number `step`.
+void SetUpStep(const Tools& tools, const Observation& seen, const KnownPerson* known, int step,
+               Face* face, double* x) {
   Workspace* const work = tools.work;
   double* const a = work->normal;
-  for (int step = 0; step < steps; step++) {
-    const bool pose_only = step < 2;
-    tools.kernels.face_points(tools.model, true, face, work);
-    tools.kernels.residuals(tools.model, seen, pose_only ? kWideNoise : kFirstNoise,
-                            kNoiseInflation, step > 2, face, work);
-    tools.kernels.linear_rows(seen, *face, work);
-    AddExpressionLimits(face->mean, work);
-    double x[kMeasuredSize];
-    for (int i = 0; i < kMeasuredSize; i++) {
-      for (int j = 0; j < kMeasuredSize; j++) {
-        a[i * kMeasuredSize + j] = static_cast<double>(work->product[i][j]);
-      }
-      x[i] = static_cast<double>(work->gradient[i]);
+  const bool pose_only = step < kPoseSteps;
+  tools.kernels.face_points(tools.model, true, face, work);
+  tools.kernels.residuals(tools.model, seen, pose_only ? kWideNoise : kFirstNoise, kNoiseInflation,
+                          step > kPoseSteps, face, work);
+  tools.kernels.linear_rows(seen, *face, work);
+  AddExpressionLimits(face->mean, work);
+  for (int i = 0; i < kMeasuredSize; i++) {
+    for (int j = 0; j < kMeasuredSize; j++) {
+      a[i * kMeasuredSize + j] = static_cast<double>(work->product[i][j]);
     }
-    for (int i = 0; i < kMotionSize; i++) {
-      double& diagonal = a[i * (kMeasuredSize + 1)];
-      diagonal = diagonal * (step < 3 ? 1.05 : 1) + 1e-3;
-    }
-    AddPriors(known, face->mean, a, x);
-    if (pose_only) {
-      for (int i = kIdentityAt; i < kMeasuredSize; i++) a[i * (kMeasuredSize + 1)] += 1e6;
-    }
-    std::memcpy(work->last_normal, a, sizeof(work->last_normal));
-    if (!FactorSymmetric(a, kMeasuredSize)) return kNoFit;
-    SolveFactored(a, kMeasuredSize, x);
-    const double turn = std::sqrt(x[0] * x[0] + x[1] * x[1] + x[2] * x[2]);
-    const double scale =
-        turn > static_cast<double>(kLongestTurn) ? static_cast<double>(kLongestTurn) / turn : 1;
-    float move[kMeasuredSize];
-    for (int i = 0; i < kMeasuredSize; i++) move[i] = static_cast<float>(x[i] * scale);
-    ApplyStep(move, &face->mean);
-    if (!IsPlausible(face->mean)) return kNoFit;
-    const bool settled = step >= 3 && turn < static_cast<double>(kSmallTurn);
-    if (settled && !to_the_end && step < steps - 2) break;
+    x[i] = static_cast<double>(work->gradient[i]);
   }
-  tools.kernels.face_points(tools.model, false, face, work);
-  tools.kernels.residuals(tools.model, seen, kFirstNoise, kNoiseInflation, true, face, work);
+  for (int i = 0; i < kMotionSize; i++) {
+    double& diagonal = a[i * (kMeasuredSize + 1)];
+    diagonal = diagonal * (step <= kPoseSteps ? 1.05 : 1) + 1e-3;
+  }
+  AddPriors(known, face->mean, a, x);
+  if (pose_only) {
+    for (int i = kIdentityAt; i < kMeasuredSize; i++) a[i * (kMeasuredSize + 1)] += 1e6;
+  }
+}
+
+// The robust cost of the face as it is, and for a stranger that of the identity.
+float StartCost(const Tools& tools, const Observation& seen, const KnownPerson* known, Face* face) {
+  const Workspace& work = *tools.work;
+  tools.kernels.face_points(tools.model, false, face, tools.work);
+  tools.kernels.residuals(tools.model, seen, kFirstNoise, kNoiseInflation, true, face, tools.work);
   double cost = 0;
   for (int i = 0; i < kMeasurementStride; i++) {
     if (!(seen.active[i] > 0)) continue;
     cost += static_cast<double>(kFreedom + 2) *
-            std::log(1 + static_cast<double>(work->square[i]) / static_cast<double>(kFreedom));
+            std::log(1 + static_cast<double>(work.square[i]) / static_cast<double>(kFreedom));
   }
   if (known == nullptr) {
     for (const float value : face->mean.identity) {
@@ -174,6 +163,30 @@ float FitSteps(const Tools& tools, const Observation& seen, const KnownPerson* k
   }
   return std::isfinite(cost) && cost < static_cast<double>(kNoFit) ? static_cast<float>(cost)
                                                                    : kNoFit;
+}
+
+// Damped Gauss-Newton steps; ends before the last two once the face has settled, unless told to go
+// to the end. Keeps the last normal equations in the workspace. Returns StartCost.
+float FitSteps(const Tools& tools, const Observation& seen, const KnownPerson* known, int steps,
+               bool to_the_end, Face* face) {
+  Workspace* const work = tools.work;
+  for (int step = 0; step < steps; step++) {
+    double x[kMeasuredSize];
+    SetUpStep(tools, seen, known, step, face, x);
+    std::memcpy(work->last_normal, work->normal, sizeof(work->last_normal));
+    if (!FactorSymmetric(work->normal, kMeasuredSize)) return kNoFit;
+    SolveFactored(work->normal, kMeasuredSize, x);
+    const double turn = std::sqrt(x[0] * x[0] + x[1] * x[1] + x[2] * x[2]);
+    const auto longest = static_cast<double>(kLongestTurn);
+    const double scale = turn > longest ? longest / turn : 1;
+    float move[kMeasuredSize];
+    for (int i = 0; i < kMeasuredSize; i++) move[i] = static_cast<float>(x[i] * scale);
+    ApplyStep(move, &face->mean);
+    if (!IsPlausible(face->mean)) return kNoFit;
+    const bool settled = step > kPoseSteps && turn < static_cast<double>(kSmallTurn);
+    if (settled && !to_the_end && step < steps - 2) break;
+  }
+  return StartCost(tools, seen, known, face);
 }
 
 // The covariance of the last fit; nothing is known of the movement.

@@ -18,7 +18,7 @@ constexpr double kSmoothingRange = 4;
 // By Simpson's rule: the closed form is a difference of nearly equal exponentials.
 void IntegrateBlur(double s, double scale, float* blur) {
   constexpr int kIntervals = 16;
-  constexpr double l = kAccelerationDecay;
+  const double l = kAccelerationDecay;
   double sum[6] = {};
   for (int i = 0; i <= kIntervals; i++) {
     const double t = s * i / kIntervals;
@@ -37,7 +37,7 @@ void IntegrateBlur(double s, double scale, float* blur) {
 
 TimeStep MakeTimeStep(double seconds, float smoothing) {
   const double s = std::min(std::max(seconds * kStepsPerSecond, kShortestStep), kLongestStep);
-  constexpr double l = kAccelerationDecay;
+  const double l = kAccelerationDecay;
   const double kept = std::exp(-l * s);
   TimeStep step;
   step.steps = s;

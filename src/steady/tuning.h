@@ -80,6 +80,7 @@ constexpr float kIdentityStep = 0.15f;
 constexpr float kNoseDepth = 38.0f;  // of the tip before the line from the eyes to the mouth
 constexpr float kPoorStart = 2.0f;   // robust cost a measurement, from which other turns are tried
 constexpr float kWideNoise = 25.0f;  // px^2, of the first two steps
+constexpr int kPoseSteps = 2;        // of the pose alone, at first
 constexpr int kFirstSteps = 10;
 constexpr int kLastSteps = 5;
 constexpr float kLongestTurn = 0.5f;      // of one step
