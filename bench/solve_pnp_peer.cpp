@@ -124,8 +124,8 @@ Run RunPnp(const Track& track, const std::vector<cv::Point3d>& mean, const Selec
   return run;
 }
 
-Run RunEngine(const Track& track, const std::string& model) {
-  const auto results = RunTrack(track, model, TrackMode::kRigid);
+Run RunEngine(const Track& track, const std::string& model, TrackerKind tracker) {
+  const auto results = RunTrack(track, model, TrackMode::kRigid, {}, tracker);
   Run run;
   run.poses = CameraPoses(track, results);
   for (std::size_t f = 0; f < results.size(); ++f) {
@@ -242,8 +242,11 @@ void RunPeer(const std::string& model, const std::vector<std::string>& paths) {
   }
   Comparison comparison(tracks, mean);
   std::vector<Run> runs;
-  for (const Track& track : tracks) runs.push_back(RunEngine(track, model));
-  comparison.Add("engine, rigid", runs);
+  for (const TrackerKind tracker : {TrackerKind::kClassic, TrackerKind::kSteady}) {
+    runs.clear();
+    for (const Track& track : tracks) runs.push_back(RunEngine(track, model, tracker));
+    comparison.Add(tracker == TrackerKind::kSteady ? "engine, steady" : "engine, rigid", runs);
+  }
   for (const Selection& selection : kSelections) {
     runs.clear();
     for (const Track& track : tracks) runs.push_back(RunPnp(track, mean, selection));
