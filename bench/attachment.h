@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 // How well things hold to a head: four points fixed to it (the nose bridge, above the forehead, in
 // front of each ear) are drawn by an estimated pose and compared with where they are in the true
-// picture.
+// image.
 //
 // An estimator attaches to the mean head. On a person the bridge is where the person's own nose
 // bridge is; the other points are the mean head's, enlarged about the point midway between the ears
@@ -19,7 +19,7 @@
 namespace n3ds::tool {
 
 struct AttachmentScore {
-  std::vector<double> errors;  // mean of the four points, percent of the pupils' distance
+  std::vector<double> errors;  // mean of the four points, percent of the interpupillary distance
   // Second differences of the error from frame to frame, mean of the four points, in pixels at a
   // width of the face of 200 pixels.
   std::vector<double> jitter;

@@ -19,7 +19,7 @@ using n3ds::bench::kTrackHeight;
 using n3ds::bench::kTrackWidth;
 using n3ds::testing::ModelBytes;
 
-// An engine with a picture to process and room for its results.
+// An engine with an image to process and room for its results.
 struct Host {
   void* engine = Norvale_3DSticker_CreateEngine();
   NSVL_OFFSCREEN image = {};

@@ -9,7 +9,7 @@ namespace n3ds::bench {
 
 namespace {
 
-cv::Rect BoundingRect(const cv::Point2f* corners, const cv::Size& picture) {
+cv::Rect BoundingRect(const cv::Point2f* corners, const cv::Size& image) {
   float left = corners[0].x, right = left, top = corners[0].y, bottom = top;
   for (int c = 1; c < 3; ++c) {
     left = std::min(left, corners[c].x);
@@ -19,7 +19,7 @@ cv::Rect BoundingRect(const cv::Point2f* corners, const cv::Size& picture) {
   }
   const cv::Point from(cvFloor(left), cvFloor(top));
   const cv::Point to(cvCeil(right) + 1, cvCeil(bottom) + 1);
-  return cv::Rect(from, to) & cv::Rect(cv::Point(), picture);
+  return cv::Rect(from, to) & cv::Rect(cv::Point(), image);
 }
 
 double Cross(const cv::Point2f& a, const cv::Point2f& b, const cv::Point2f& p) {
@@ -34,13 +34,12 @@ void WarpPiecewise(const cv::Mat& texture, const std::vector<TrianglePair>& tria
   // Buffers large enough for any triangle, so that the loop allocates nothing.
   cv::Mat warped(output->size(), CV_8UC4), inside(output->size(), CV_8UC1);
   for (const TrianglePair& t : triangles) {
-    const cv::Rect box = BoundingRect(t.picture, output->size());
+    const cv::Rect box = BoundingRect(t.image, output->size());
     if (box.empty()) continue;
     cv::Point2f corners[3];
     cv::Point fixed[3];  // with 8 fractional bits
     for (int c = 0; c < 3; ++c) {
-      const cv::Point2f corner =
-          t.picture[c] - cv::Point2f(0.5f, 0.5f);  // centres at whole numbers
+      const cv::Point2f corner = t.image[c] - cv::Point2f(0.5f, 0.5f);  // centres at whole numbers
       corners[c] = corner - cv::Point2f(box.tl());
       fixed[c] = cv::Point(cvRound(corners[c].x * 256), cvRound(corners[c].y * 256));
     }
@@ -57,14 +56,14 @@ void WarpPiecewise(const cv::Mat& texture, const std::vector<TrianglePair>& tria
 
 CoordinateMap RenderMap(const std::vector<TrianglePair>& triangles) {
   std::vector<cv::Point2f> corners;
-  for (const TrianglePair& t : triangles) corners.insert(corners.end(), t.picture, t.picture + 3);
+  for (const TrianglePair& t : triangles) corners.insert(corners.end(), t.image, t.image + 3);
   CoordinateMap result;
   result.where = cv::boundingRect(corners);
   result.map = cv::Mat(result.where.size(), CV_32FC2, cv::Scalar(-1, -1));
   const cv::Point2f origin(result.where.tl());
   for (const TrianglePair& t : triangles) {
     cv::Point2f p[3];
-    for (int c = 0; c < 3; ++c) p[c] = t.picture[c] - origin;
+    for (int c = 0; c < 3; ++c) p[c] = t.image[c] - origin;
     const double area = Cross(p[0], p[1], p[2]);
     if (area == 0) continue;
     const cv::Rect box = BoundingRect(p, result.where.size());

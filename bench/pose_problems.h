@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Problems for the pose solver: a face of 95 points in a picture of 1280 x 720, its landmarks
+// Problems for the pose solver: a face of 95 points in an image of 1280 x 720, its landmarks
 // rounded to pixels with noise, and as start the pose of the frame before.
 #pragma once
 

@@ -227,7 +227,7 @@ constexpr char kSummaryLegend[] =
     "rot20..    as above\n"
     "own        rotation error, median, when every person's own mean error is taken off as well\n"
     "attach     offset of points on the nose bridge, above the forehead and in front of the ears,\n"
-    "           percent of the pupils' distance; nothing is taken off\n"
+    "           percent of the interpupillary distance; nothing is taken off\n"
     "depth      as above\n"
     "jitter     second difference of these points less the true ones', pixels at a face width of\n"
     "           200\n"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Faces of an example track, followed in mask mode: what the benchmarks of meshes and mask pictures
+// Faces of an example track, followed in mask mode: what the benchmarks of meshes and mask images
 // work on.
 #pragma once
 
@@ -11,7 +11,7 @@
 
 namespace n3ds::bench {
 
-// The landmarks of one picture's faces.
+// The landmarks of one image's faces.
 struct TrackedFrame {
   std::vector<__tag_point> points;  // 101 a face, face after face
 };

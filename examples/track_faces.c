@@ -30,7 +30,7 @@ static int NextFrame(FILE* file, unsigned n_landmarks, unsigned* n_faces) {
 static void PrintFace(int frame, unsigned index, const Norvale_3DSticker_Face_Matrix* face) {
   const float* m = face->modelMatrix;
   const float* v = face->viewMatrix;
-  double yaw = atan2(m[8], m[10]) * 180.0 / 3.14159265358979;
+  double yaw = atan2((double)m[8], (double)m[10]) * 180.0 / 3.14159265358979;
   printf("frame %d face %u: at %.0f %.0f %.0f mm, yaw %.1f degrees\n", frame, index,
          (double)(m[12] + v[12]), (double)(m[13] + v[13]), (double)(m[14] + v[14]), yaw);
 }

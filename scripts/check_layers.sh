@@ -7,7 +7,7 @@ set -euo pipefail
 cd "${1:-$(dirname "$0")/..}"
 
 # shellcheck disable=SC2016  # the dollars are awk's
-find src -name '*.h' -o -name '*.cpp' | sort | xargs awk -v layers="platform math core mask" '
+find src -name '*.h' -o -name '*.cpp' | sort | xargs awk -v layers="platform math core mask steady" '
   BEGIN {
     top = split(layers, names) + 1
     for (i in names) rank[names[i]] = i

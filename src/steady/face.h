@@ -10,7 +10,7 @@
 
 namespace n3ds::steady {
 
-// The state's mean. The camera frame is that of the upright picture: x right, y down, z forward.
+// The state's mean. The camera frame is that of the upright image: x right, y down, z forward.
 struct StateMean {
   Rotation rotation;  // model frame to camera frame
   float place[3];     // of the model's centre: x / z, y / z, log z, z in mm
@@ -22,7 +22,7 @@ struct StateMean {
 
 // Landmarks of a frame and its camera.
 struct Observation {
-  const float* u;  // pixels of the upright picture, kMeasurementStride of each
+  const float* u;  // pixels of the upright image, kMeasurementStride of each
   const float* v;
   const float* active;  // 1 for measurements that there are, 0 for others
   int count;            // of active measurements

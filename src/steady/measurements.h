@@ -18,9 +18,9 @@ extern const Middle kMiddles[kMiddleCount];
 const float* ActiveMeasurements(bool has_middles);
 int ActiveCount(bool has_middles);
 
-// Landmarks as measurements. Coordinates beyond any picture are held at its limit, so that nothing
+// Landmarks as measurements. Coordinates beyond any image are held at its limit, so that nothing
 // that is computed from them overflows.
-//   landmarks  101 or 165 pairs x, y, pixels of the upright picture
+//   landmarks  101 or 165 pairs x, y, pixels of the upright image
 //   u, v       out: kMeasurementStride each
 void FillMeasurements(const int* landmarks, int count, float* u, float* v);
 

@@ -13,7 +13,7 @@ namespace n3ds::steady {
 
 // A frame, with what the host has chosen.
 struct FrameInput {
-  int32_t width;  // of the upright picture, pixels
+  int32_t width;  // of the upright image, pixels
   int32_t height;
   float focal;      // pixels
   double seconds;   // since the last frame

@@ -210,17 +210,17 @@ TEST(MaskAllocation, WarpReportsThatThereIsNoMemoryForItsOutput) {
   std::vector<uint8_t> texture(16 * 16 * 4, 255);
   N3DS_2D_TEXTURE_MASK mask = {};
   mask.image = {N3DS_FORMAT_BGRA32, 16, 16, {texture.data()}, {64}};
-  NSVL_OFFSCREEN picture = {};
+  NSVL_OFFSCREEN image = {};
   {
     const FailingMemory memory(1);
-    EXPECT_EQ(N3DS_WarpFaceMask(core->handle(), &mask, &picture, output.models, 64, 48, 0),
+    EXPECT_EQ(N3DS_WarpFaceMask(core->handle(), &mask, &image, output.models, 64, 48, 0),
               N3DS_NO_MEMORY);
     EXPECT_EQ(memory.requests(), 1);
     EXPECT_EQ(memory.outstanding(), 0);
-    EXPECT_EQ(picture.plane[0], nullptr);
+    EXPECT_EQ(image.plane[0], nullptr);
   }
-  EXPECT_EQ(N3DS_WarpFaceMask(core->handle(), &mask, &picture, output.models, 64, 48, 0), N3DS_OK);
-  MMemFree(nullptr, picture.plane[0]);
+  EXPECT_EQ(N3DS_WarpFaceMask(core->handle(), &mask, &image, output.models, 64, 48, 0), N3DS_OK);
+  MMemFree(nullptr, image.plane[0]);
 }
 
 }  // namespace

@@ -385,7 +385,7 @@ TEST(MaskWorker, FirstNinetyFiveLandmarksOnlyAreSmoothed) {
             Points(second.begin() + 190, second.end()));
 }
 
-// Moves the eight steady points, and nothing else, by whole pixels each.
+// Moves the eight steady points, and nothing else, by integer pixels each.
 Points WithMotion(Points landmarks, int pixels) {
   for (const int k : {45, 51, 63, 64, 68, 69, 73, 74}) landmarks[2 * k] += pixels;
   return landmarks;
@@ -544,7 +544,7 @@ TEST(MaskWorker, WritesPoseMatrixModelViewAndProjection) {
   EXPECT_EQ(face.result.landmarks3D, &landmark_buffer);
 }
 
-TEST(MaskWorker, OddPictureSizesCountOnePixelLessInTheProjection) {
+TEST(MaskWorker, OddImageSizesCountOnePixelLessInTheProjection) {
   Face face;
   face.camera = Camera(641, 479);
   face.Run(DetectLandmarks(ModelShape(), {}, 641, 479));
@@ -696,7 +696,7 @@ TEST(MaskDriver, SmoothedLandmarksAreWrittenBackToTheCaller) {
   EXPECT_TRUE(std::equal(moved.begin(), moved.end(), core->context().landmarkHistory));
 }
 
-// Distances between where a shape's inner landmark vertices fall in the picture and what the
+// Distances between where a shape's inner landmark vertices fall in the image and what the
 // detector saw, in percent of the distance between the pupils.
 void AddErrors(const TrackingContext& context, const float* pose, const float* shape,
                const Points& seen, std::vector<double>* errors) {

@@ -60,7 +60,7 @@ TEST(ProjectionMatrix, OfAFocalLengthOf500In640By480) {
   EXPECT_THAT(out, ElementsAreArray(expected));
 }
 
-TEST(ProjectionMatrix, AnOffCentreCameraShiftsThePicture) {
+TEST(ProjectionMatrix, AnOffCentreCameraShiftsTheImage) {
   const float k[9] = {500, 0, 330, 0, 400, 200, 0, 0, 1};
   float out[16];
   ASSERT_EQ(SolveForProjectionMatrix(k, 640, 480, 0.1f, 10.0f, out), N3DS_OK);
@@ -137,7 +137,7 @@ TEST(OutputMatrices, ProjectEveryPointToItsPixel) {
   }
 }
 
-TEST(OutputMatrices, AnOddPictureLosesItsLastColumnAndRow) {
+TEST(OutputMatrices, AnOddImageLosesItsLastColumnAndRow) {
   const Camera camera(641, 481);
   ASSERT_EQ(camera.k[2], 320.5f);
   const float t[3] = {0, 0, 1};
@@ -148,7 +148,7 @@ TEST(OutputMatrices, AnOddPictureLosesItsLastColumnAndRow) {
   EXPECT_EQ(Bits(result.projectionMatrix), Bits(expected));
 }
 
-TEST(OutputMatrices, APictureOfOnePixelKeepsTheProjectionBefore) {
+TEST(OutputMatrices, AImageOfOnePixelKeepsTheProjectionBefore) {
   const Camera camera(1, 1);
   const float t[3] = {0, 0, 1};
   N3DS_RIGID_MATRIX result = {};

@@ -24,7 +24,7 @@ using ::testing::ElementsAreArray;
 
 constexpr FitWeights kWeights = {0, 1.0f, 1.0f, 1.0f};
 
-// A fit's arguments and results, ready for a frontal face in a 640 x 480 picture.
+// A fit's arguments and results, ready for a frontal face in a 640 x 480 image.
 struct Fit {
   std::vector<int32_t> landmarks = DetectLandmarks(ModelShape(), HeadPlace{}, 640, 480);
   std::vector<float> vertices = MeanShapeFloats();

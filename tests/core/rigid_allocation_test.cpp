@@ -217,7 +217,7 @@ TEST(RigidAllocation, AOneFaceCoreRunsInAPoolOfItsOwn) {
 }
 
 // Pools that are too small for the driver's part of a first frame. (One that has room for the
-// driver but not for a fit would keep the worker repeating for ever.)
+// driver but not for a fit would keep the worker repeating without end.)
 TEST(RigidAllocation, APoolTooSmallForTheDriverIsRefusedWithoutLoss) {
   const size_t model = sizeof(TrackingContext) + 10872 + 173952 + 217440 + 3479040 + 5 * 16;
   const size_t history = 5 * 202 * 4 + 16;

@@ -137,7 +137,7 @@ TEST(GetRigidMatrix, LandmarksAreThoseOfThePoseTiltedIntoTheFrameOfTheModelMatri
   EXPECT_EQ(Bits(records.landmarks(0)), Bits(expected));
 }
 
-// Where a point of the model matrix's frame lands in the picture.
+// Where a point of the model matrix's frame lands in the image.
 void ToPixel(const N3DS_RIGID_MATRIX& record, const float* p, double width, double height,
              double* u, double* v) {
   double world[4], eye[4], clip[4];

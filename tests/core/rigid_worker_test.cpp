@@ -336,7 +336,7 @@ TEST(RigidWorkers, MatchTheStraightforwardVersionOnJumpyLandmarks) {
 }
 
 TEST(RigidWorkers, FailedFitsAreRepeatedWithLandmarksMovedByOnePixel) {
-  // In a picture of a few pixels the normal equations often lose their rank, until the landmarks
+  // In an image of a few pixels the normal equations often lose their rank, until the landmarks
   // move. The repeats have no bound, and with the shipped model seed 6 never gets out of them.
   Totals totals;
   for (uint64_t seed = 7; seed < 19; seed++) {

@@ -176,7 +176,7 @@ TEST(ExpressionFit, RecoversAKnownExpressionOfAKnownPerson) {
     const Vector truth = RandomCoefficients(&random, 20, 0.5);
     Vector coef(20, 7.0f);
     ASSERT_EQ(fit.Expression(fit.view.Pixels(person, truth), person, &coef), N3DS_OK);
-    // Whole pixels are about half a mm here; a coefficient of 1 moves a vertex by several.
+    // Integer pixels are about half a mm here; a coefficient of 1 moves a vertex by several.
     for (int j = 0; j < 20; ++j) EXPECT_NEAR(coef[j], truth[j], 0.05) << "expression " << j;
   }
 }
@@ -303,7 +303,7 @@ TEST(ShapeFitSubstitution, StandInMovesTheResultAsOftenAsItStands) {
 
 // --- Priors ----------------------------------------------------------------------------------
 
-TEST(IdentityFit, LargerPicturesHoldTheDepthMoreFirmly) {
+TEST(IdentityFit, LargerImagesHoldTheDepthMoreFirmly) {
   Random random = TestRandom();
   Fit fit(random.Next());
   const Vector truth = RandomCoefficients(&random, 16, 0.5);
@@ -326,7 +326,7 @@ TEST(IdentityFit, LargerPicturesHoldTheDepthMoreFirmly) {
   }
 }
 
-TEST(ExpressionFit, LargerPicturesPullHarderTowardZero) {
+TEST(ExpressionFit, LargerImagesPullHarderTowardZero) {
   Random random = TestRandom();
   Fit fit(random.Next());
   const std::vector<int32_t> pixels = fit.view.Pixels({}, RandomCoefficients(&random, 20, 0.5));
@@ -425,7 +425,7 @@ TEST(ExpressionFit, NullPointersAreRefusedAndNothingIsWritten) {
   }
 }
 
-// Pools from too small for anything to big enough: first the system itself cannot be had (-201),
+// Pools from too small for anything to big enough: first the system itself cannot be allocated (-201),
 // then the solver's scratch (0, and the coefficients stay), then the fit succeeds.
 template <typename Solve>
 void ExpectCleanFailureOfEveryAllocation(size_t system_floats, int count, Solve solve) {

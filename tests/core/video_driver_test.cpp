@@ -78,7 +78,7 @@ TEST(Drivers, NullCoreAndNullImageAreRefused) {
   }
 }
 
-TEST(Drivers, APictureWithoutPixelsIsRefused) {
+TEST(Drivers, AImageWithoutPixelsIsRefused) {
   for (const Driver driver : kDrivers) {
     const auto core = Core::Ready();
     ASSERT_EQ(Track(*core, FacesAt({0}), 640, 480, driver), N3DS_OK);
@@ -229,7 +229,7 @@ TEST(Drivers, LandmarksAreKeptAsTheyArrived) {
   }
 }
 
-TEST(Drivers, CameraHasItsCentreInThePictureAndTheMeanOfTheSidesAsFocalLength) {
+TEST(Drivers, CameraHasItsCentreInTheImageAndTheMeanOfTheSidesAsFocalLength) {
   for (const Driver driver : kDrivers) {
     const auto core = Core::Ready();
     ASSERT_EQ(Track(*core, FacesAt({0}), 640, 480, driver), N3DS_OK);
@@ -463,14 +463,14 @@ TEST(RigidDriver, MatchesTheStraightforwardVersionOnPeopleWhoComeAndGo) {
 }
 
 TEST(RigidDriver, MatchesTheStraightforwardVersionWhereFitsFail) {
-  // A picture of a few pixels: fits fail and are repeated.
+  // An image of a few pixels: fits fail and are repeated.
   const auto core = Core::Ready();
   ReferenceTracker tracker(core->context());
   CompareWithReference(5, 30, 5, 101, 5, 4, &tracker, *core);
   EXPECT_GT(tracker.events.retries, 20);
 }
 
-TEST(RigidDriver, ThePictureMayChangeItsSizeBetweenFrames) {
+TEST(RigidDriver, TheImageMayChangeItsSizeBetweenFrames) {
   const auto core = Core::Ready();
   ReferenceTracker tracker(core->context());
   for (int i = 0; i < 6; i++) {
@@ -496,7 +496,7 @@ TEST(Drivers, CoordinatesAtTheEndsOfTheRangeAreHarmless) {
   }
 }
 
-TEST(Drivers, ThePicturesPixelsAreNotTouched) {
+TEST(Drivers, TheImagesPixelsAreNotTouched) {
   for (const Driver driver : kDrivers) {
     const auto core = Core::Ready();
     FaceRecords records(FacesAt({0}));

@@ -154,8 +154,8 @@ inline std::vector<size_t> MirrorPartners(size_t count) {
   return partners;
 }
 
-// One face's upright landmarks as a camera delivers them whose picture has to be turned clockwise
-// by `degree`, and is mirrored or not; width and height are those of the upright picture.
+// One face's upright landmarks as a camera delivers them whose image has to be turned clockwise
+// by `degree`, and is mirrored or not; width and height are those of the upright image.
 inline Points Deliver(const Points& upright, uint32_t degree, bool mirrored, int32_t width,
                       int32_t height) {
   const bool quarter = degree == 90 || degree == 270;

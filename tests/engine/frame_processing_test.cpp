@@ -185,11 +185,11 @@ TEST(RigidFrame, InputIsOnlyRead) {
   EXPECT_EQ(std::memcmp(&image, &image_before, sizeof(image)), 0);
 }
 
-TEST(RigidFrame, AQuarterTurnSwapsThePicturesSides) {
+TEST(RigidFrame, AQuarterTurnSwapsTheImagesSides) {
   for (const uint32_t degree : {90u, 270u}) {
     const auto engine = Engine::Ready(degree, 0);
     RigidOutput out(101);
-    // A 480 x 640 upright picture, delivered as 640 x 480.
+    // A 480 x 640 upright image, delivered as 640 x 480.
     const Points upright = ToPoints(DetectLandmarks(ModelShape(), HeadPlace{}, 480, 640));
     ASSERT_EQ(
         Process(*engine, ImageOf(640, 480), Deliver(upright, degree, false, 480, 640), 101, &out),
@@ -200,7 +200,7 @@ TEST(RigidFrame, AQuarterTurnSwapsThePicturesSides) {
   }
 }
 
-TEST(RigidFrame, AnUnusualDegreeKeepsThePicturesSides) {
+TEST(RigidFrame, AnUnusualDegreeKeepsTheImagesSides) {
   for (const uint32_t degree : {180u, 45u}) {
     const auto engine = Engine::Ready(degree, 0);
     RigidOutput out(101);
@@ -225,7 +225,7 @@ std::vector<Points> Scene(int count, int width, int height) {
   return frames;
 }
 
-TEST(RigidFrame, TurnedAndMirroredDeliveriesGiveTheSameBitsAsTheUprightPicture) {
+TEST(RigidFrame, TurnedAndMirroredDeliveriesGiveTheSameBitsAsTheUprightImage) {
   constexpr int kWidth = 600, kHeight = 800;
   for (const int count : {101, 165}) {
     const auto landmarks = static_cast<uint32_t>(count);

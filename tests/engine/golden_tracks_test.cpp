@@ -98,7 +98,7 @@ Track Turned(Track track) {
   return track;
 }
 
-// Not-a-number has no one bit pattern, so it is refused.
+// NaN has no one bit pattern, so it is refused.
 bool AllFinite(const float* values, size_t count) {
   return std::all_of(values, values + count, [](float value) { return std::isfinite(value); });
 }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// CNorvaleFaceShapeImp::TransformInputInfo: from the delivered picture's landmarks to upright ones.
+// CNorvaleFaceShapeImp::TransformInputInfo: from the delivered image's landmarks to upright ones.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 

@@ -22,7 +22,7 @@ namespace {
 constexpr int kWidth = 1280, kHeight = 720;
 
 // An engine, its output records with landmark buffers of exactly the promised size, and one
-// picture.
+// image.
 class MaskFrame : public ::testing::Test {
  protected:
   MaskFrame() : engine_(Norvale_3DSticker_CreateEngine()), image_(ImageOf(kWidth, kHeight)) {
@@ -240,7 +240,7 @@ TEST_F(MaskFrame, PointsAreOnlyRead) {
   }
 }
 
-// A turned or mirrored picture of the same face gives the same mesh.
+// A turned or mirrored image of the same face gives the same mesh.
 TEST_F(MaskFrame, OrientationIsTakenOut) {
   const auto upright = Points(1);
   std::vector<float> expected;

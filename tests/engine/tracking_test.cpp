@@ -108,7 +108,7 @@ TEST_P(Tracking, FollowsTheTruth) {
             << "person " << face.id << " in frame " << frame.number;
       }
 
-      // Nearer to this person's place in the picture than to any other's.
+      // Nearer to this person's place in the image than to any other's.
       const auto distance = [&](const TrackFace& other) {
         const double focal_ratio = *track.header.focal / assumed_focal;
         const double x = pose.translation[0] / pose.translation[2] / focal_ratio;

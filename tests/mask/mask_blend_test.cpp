@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <vector>
 
-#include "mask/test_picture.h"
+#include "mask/test_image.h"
 #include "norvale_3d_sticker_core.h"
 #include "support/null_arguments.h"
 #include "support/test_random.h"
@@ -22,7 +22,7 @@ double ShadingReference(int r, int g, int b) {
   return 0.5 + 0.5 * grey;
 }
 
-void BlendBgr24Reference(TestPicture& image, TestPicture& mask, TestPicture& output) {
+void BlendBgr24Reference(TestImage& image, TestImage& mask, TestImage& output) {
   for (int y = 0; y < mask.height(); ++y) {
     for (int x = 0; x < mask.width(); ++x) {
       const int b = *image.At(0, 3 * x, y), g = *image.At(0, 3 * x + 1, y),
@@ -39,7 +39,7 @@ void BlendBgr24Reference(TestPicture& image, TestPicture& mask, TestPicture& out
   }
 }
 
-void BlendNv21Reference(TestPicture& image, TestPicture& mask, TestPicture& output) {
+void BlendNv21Reference(TestImage& image, TestImage& mask, TestImage& output) {
   for (int y = 0; y < image.height() / 2; ++y) {
     for (int x = 0; x < image.width() / 2; ++x) {
       bool touched = false;
@@ -70,7 +70,7 @@ void BlendNv21Reference(TestPicture& image, TestPicture& mask, TestPicture& outp
   }
 }
 
-void BlendReference(TestPicture& image, TestPicture& mask, TestPicture& output) {
+void BlendReference(TestImage& image, TestImage& mask, TestImage& output) {
   if (image.descriptor().pixelFormat == N3DS_FORMAT_BGR24) {
     BlendBgr24Reference(image, mask, output);
   } else {
@@ -79,8 +79,8 @@ void BlendReference(TestPicture& image, TestPicture& mask, TestPicture& output) 
 }
 
 // A mask with transparent areas, opaque ones and every alpha between them.
-TestPicture RandomMask(int width, int height, int padding, Random& random) {
-  TestPicture mask(N3DS_FORMAT_BGRA32, width, height, padding);
+TestImage RandomMask(int width, int height, int padding, Random& random) {
+  TestImage mask(N3DS_FORMAT_BGRA32, width, height, padding);
   mask.Randomise(random);
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
@@ -103,12 +103,12 @@ TEST_P(BlendFormats, MatchesTheReferenceOnAllSizes) {
   for (int height = 1; height <= 9; ++height) {
     for (int width = 1; width <= 40; ++width) {
       for (const int padding : {0, 5}) {
-        TestPicture image(GetParam(), width, height, padding);
+        TestImage image(GetParam(), width, height, padding);
         image.Randomise(random);
-        TestPicture mask = RandomMask(width, height, padding / 2, random);
-        TestPicture output(GetParam(), width, height, 3 * padding);
+        TestImage mask = RandomMask(width, height, padding / 2, random);
+        TestImage output(GetParam(), width, height, 3 * padding);
         output.Fill(77);
-        TestPicture expected(output);
+        TestImage expected(output);
         BlendReference(image, mask, expected);
         const auto image_before = image.Bytes(), mask_before = mask.Bytes();
         ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
@@ -120,13 +120,13 @@ TEST_P(BlendFormats, MatchesTheReferenceOnAllSizes) {
   }
 }
 
-TEST_P(BlendFormats, InPlaceGivesTheSamePicture) {
+TEST_P(BlendFormats, InPlaceGivesTheSameImage) {
   Random random = TestRandom();
   for (const auto& [width, height] : {std::pair(1, 1), {2, 2}, {3, 3}, {17, 9}, {64, 32}}) {
-    TestPicture image(GetParam(), width, height, 1);
+    TestImage image(GetParam(), width, height, 1);
     image.Randomise(random);
-    TestPicture mask = RandomMask(width, height, 0, random);
-    TestPicture expected(image);
+    TestImage mask = RandomMask(width, height, 0, random);
+    TestImage expected(image);
     BlendReference(image, mask, expected);
     ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
     ASSERT_EQ(image.Bytes(), expected.Bytes()) << width << " x " << height;
@@ -134,21 +134,21 @@ TEST_P(BlendFormats, InPlaceGivesTheSamePicture) {
 }
 
 TEST_P(BlendFormats, AnyCoreHandleIsAccepted) {
-  TestPicture image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGRA32, 4, 4);
+  TestImage image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGRA32, 4, 4);
   int anything = 0;
   EXPECT_EQ(N3DS_BlendFaceMask(&anything, image.get(), mask.get(), image.get()), N3DS_OK);
 }
 
 TEST_P(BlendFormats, RejectsNullArgumentsFirst) {
-  TestPicture image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGR24, 4, 4), output(GetParam(), 4, 4);
+  TestImage image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGR24, 4, 4), output(GetParam(), 4, 4);
   ExpectEachNullRefused(N3DS_NULL_ARGUMENT, N3DS_BlendFaceMask, nullptr, image.get(), mask.get(),
                         output.get());
 }
 
 TEST_P(BlendFormats, RejectsAMaskWithoutAlphaAndDifferentFormatsBeforeWriting) {
   Random random = TestRandom();
-  TestPicture image(GetParam(), 4, 4), output(GetParam(), 4, 4);
-  TestPicture mask(N3DS_FORMAT_BGRA32, 4, 4), plain_mask(N3DS_FORMAT_BGR24, 4, 4);
+  TestImage image(GetParam(), 4, 4), output(GetParam(), 4, 4);
+  TestImage mask(N3DS_FORMAT_BGRA32, 4, 4), plain_mask(N3DS_FORMAT_BGR24, 4, 4);
   mask.Fill(255);
   plain_mask.Fill(255);
   output.Randomise(random);
@@ -157,7 +157,7 @@ TEST_P(BlendFormats, RejectsAMaskWithoutAlphaAndDifferentFormatsBeforeWriting) {
             N3DS_BAD_VALUE);
   for (const uint32_t format : {N3DS_FORMAT_BGR24, N3DS_FORMAT_NV21, N3DS_FORMAT_BGRA32}) {
     if (format == GetParam()) continue;
-    TestPicture other(format, 4, 4);
+    TestImage other(format, 4, 4);
     EXPECT_EQ(N3DS_BlendFaceMask(nullptr, other.get(), mask.get(), output.get()), N3DS_BAD_VALUE);
     const auto other_before = other.Bytes();
     EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), other.get()), N3DS_BAD_VALUE);
@@ -167,10 +167,10 @@ TEST_P(BlendFormats, RejectsAMaskWithoutAlphaAndDifferentFormatsBeforeWriting) {
 }
 
 TEST(MaskBlend, RejectsImageFormatsItDoesNotKnow) {
-  TestPicture mask(N3DS_FORMAT_BGRA32, 4, 4);
+  TestImage mask(N3DS_FORMAT_BGRA32, 4, 4);
   mask.Fill(255);
   for (const uint32_t format : {0u, 512u, 514u, 770u, 2049u, ~0u}) {
-    TestPicture image(N3DS_FORMAT_BGRA32, 4, 4);
+    TestImage image(N3DS_FORMAT_BGRA32, 4, 4);
     image.get()->pixelFormat = format;
     const auto before = image.Bytes();
     EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_BAD_VALUE);
@@ -179,23 +179,23 @@ TEST(MaskBlend, RejectsImageFormatsItDoesNotKnow) {
 }
 
 TEST_P(BlendFormats, RejectsImagesThatAreTooSmallOrHaveNoPixelsBeforeWriting) {
-  TestPicture image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGRA32, 4, 4), output(GetParam(), 4, 4);
+  TestImage image(GetParam(), 4, 4), mask(N3DS_FORMAT_BGRA32, 4, 4), output(GetParam(), 4, 4);
   mask.Fill(255);
   output.Fill(9);
   const auto before = output.Bytes();
   const bool packed = GetParam() == N3DS_FORMAT_BGR24;
-  TestPicture* const pictures[] = {&image, &mask, &output};
-  for (TestPicture* picture : pictures) {
-    const NSVL_OFFSCREEN good = picture->descriptor();
-    const int planes = packed || picture == &mask ? 1 : 2;
+  TestImage* const images[] = {&image, &mask, &output};
+  for (TestImage* spoilt : images) {
+    const NSVL_OFFSCREEN good = spoilt->descriptor();
+    const int planes = packed || spoilt == &mask ? 1 : 2;
     for (int field = 0; field < 2 + 2 * planes; ++field) {
-      *picture->get() = good;
-      if (field == 0) picture->get()->width = 2;
-      if (field == 1) picture->get()->height = 2;
-      if (field == 2 || field == 4) picture->get()->plane[field / 2 - 1] = nullptr;
-      if (field == 3 || field == 5) picture->get()->pitch[field / 2 - 1] *= -1;
+      *spoilt->get() = good;
+      if (field == 0) spoilt->get()->width = 2;
+      if (field == 1) spoilt->get()->height = 2;
+      if (field == 2 || field == 4) spoilt->get()->plane[field / 2 - 1] = nullptr;
+      if (field == 3 || field == 5) spoilt->get()->pitch[field / 2 - 1] *= -1;
       // The packed format walks the mask's rectangle, the other one the image's.
-      const bool walked = packed ? picture == &mask : picture == &image;
+      const bool walked = packed ? spoilt == &mask : spoilt == &image;
       const MRESULT expected = walked && field < 2 ? N3DS_OK : N3DS_BAD_VALUE;
       const MRESULT status = N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get());
       EXPECT_EQ(status, expected) << "field " << field;
@@ -205,18 +205,18 @@ TEST_P(BlendFormats, RejectsImagesThatAreTooSmallOrHaveNoPixelsBeforeWriting) {
         EXPECT_EQ(output.Bytes(), before) << "field " << field;
       }
     }
-    *picture->get() = good;
+    *spoilt->get() = good;
   }
   EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
 }
 
 // A trailing odd row and column need no mask.
 TEST(MaskBlend, TwoPlaneMaskMayEndWithTheLastBlock) {
-  TestPicture image(N3DS_FORMAT_NV21, 5, 5), mask(N3DS_FORMAT_BGRA32, 4, 4);
+  TestImage image(N3DS_FORMAT_NV21, 5, 5), mask(N3DS_FORMAT_BGRA32, 4, 4);
   EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
 }
 
-TEST(MaskBlend, EmptyPicturesAreNoError) {
+TEST(MaskBlend, EmptyImagesAreNoError) {
   for (const uint32_t format : {N3DS_FORMAT_BGR24, N3DS_FORMAT_NV21}) {
     for (const int size : {0, -1, INT32_MIN}) {
       NSVL_OFFSCREEN image = {}, mask = {};
@@ -229,14 +229,14 @@ TEST(MaskBlend, EmptyPicturesAreNoError) {
 }
 
 TEST(MaskBlend, OpaqueWhiteOverBlackIsHalfBright) {
-  TestPicture image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
+  TestImage image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
   mask.Fill(255);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
   EXPECT_EQ(image.Bytes(), (std::vector<uint8_t>{126, 126, 126}));
 }
 
 TEST(MaskBlend, OpaqueWhiteOverWhiteLosesNothingButTheLastStep) {
-  TestPicture image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
+  TestImage image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
   mask.Fill(255);
   image.Fill(255);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
@@ -244,7 +244,7 @@ TEST(MaskBlend, OpaqueWhiteOverWhiteLosesNothingButTheLastStep) {
 }
 
 TEST(MaskBlend, OpaqueBlackLetsOnePartIn256Through) {
-  TestPicture image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
+  TestImage image(N3DS_FORMAT_BGR24, 1, 1), mask(N3DS_FORMAT_BGRA32, 1, 1);
   mask.Pixel(0, 0)[3] = 255;
   image.Fill(255);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
@@ -253,10 +253,10 @@ TEST(MaskBlend, OpaqueBlackLetsOnePartIn256Through) {
 
 // Blue, green and red are told apart: a red pixel shades by 0.4, a blue or a green one by 0.3.
 TEST(MaskBlend, RedWeighsMostInTheShading) {
-  TestPicture image(N3DS_FORMAT_BGR24, 3, 1), mask(N3DS_FORMAT_BGRA32, 3, 1);
+  TestImage image(N3DS_FORMAT_BGR24, 3, 1), mask(N3DS_FORMAT_BGRA32, 3, 1);
   mask.Fill(255);
   for (int c = 0; c < 3; ++c) *image.At(0, 3 * c + c, 0) = 255;
-  TestPicture output(N3DS_FORMAT_BGR24, 3, 1);
+  TestImage output(N3DS_FORMAT_BGR24, 3, 1);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
   const int shaded[3] = {static_cast<int>(255 * 0.65), static_cast<int>(255 * 0.65),
                          static_cast<int>(255 * 0.70)};
@@ -269,10 +269,10 @@ TEST(MaskBlend, RedWeighsMostInTheShading) {
   }
 }
 
-TEST(MaskBlend, TransparentMaskCopiesAPackedPicture) {
+TEST(MaskBlend, TransparentMaskCopiesAPackedImage) {
   Random random = TestRandom();
-  TestPicture image(N3DS_FORMAT_BGR24, 31, 7), output(N3DS_FORMAT_BGR24, 31, 7);
-  TestPicture mask(N3DS_FORMAT_BGRA32, 31, 7);
+  TestImage image(N3DS_FORMAT_BGR24, 31, 7), output(N3DS_FORMAT_BGR24, 31, 7);
+  TestImage mask(N3DS_FORMAT_BGRA32, 31, 7);
   image.Randomise(random);
   mask.Randomise(random);
   for (int y = 0; y < 7; ++y) {
@@ -284,8 +284,8 @@ TEST(MaskBlend, TransparentMaskCopiesAPackedPicture) {
 
 TEST(MaskBlend, TransparentMaskLeavesATwoPlaneOutputAlone) {
   Random random = TestRandom();
-  TestPicture image(N3DS_FORMAT_NV21, 30, 8), output(N3DS_FORMAT_NV21, 30, 8);
-  TestPicture mask(N3DS_FORMAT_BGRA32, 30, 8);
+  TestImage image(N3DS_FORMAT_NV21, 30, 8), output(N3DS_FORMAT_NV21, 30, 8);
+  TestImage mask(N3DS_FORMAT_BGRA32, 30, 8);
   image.Randomise(random);
   output.Randomise(random);
   const auto before = output.Bytes();
@@ -296,13 +296,13 @@ TEST(MaskBlend, TransparentMaskLeavesATwoPlaneOutputAlone) {
 // One opaque pixel makes the whole block take the round trip, and only that block.
 TEST(MaskBlend, OneOpaquePixelRewritesItsBlockOnly) {
   Random random = TestRandom();
-  TestPicture image(N3DS_FORMAT_NV21, 6, 6), mask(N3DS_FORMAT_BGRA32, 6, 6);
+  TestImage image(N3DS_FORMAT_NV21, 6, 6), mask(N3DS_FORMAT_BGRA32, 6, 6);
   image.Randomise(random);
   for (int i = 0; i < 4; ++i) {
     const int mx = 2 + i % 2, my = 2 + i / 2;
     mask.Fill(0);
     mask.Pixel(mx, my)[3] = 255;
-    TestPicture output(N3DS_FORMAT_NV21, 6, 6);
+    TestImage output(N3DS_FORMAT_NV21, 6, 6);
     output.Fill(1);
     ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
     for (int y = 0; y < 6; ++y) {
@@ -322,10 +322,10 @@ TEST(MaskBlend, OneOpaquePixelRewritesItsBlockOnly) {
   }
 }
 
-TEST(MaskBlend, TrailingOddRowAndColumnOfATwoPlanePictureStay) {
-  TestPicture image(N3DS_FORMAT_NV21, 5, 3), mask(N3DS_FORMAT_BGRA32, 5, 3);
+TEST(MaskBlend, TrailingOddRowAndColumnOfATwoPlaneImageStay) {
+  TestImage image(N3DS_FORMAT_NV21, 5, 3), mask(N3DS_FORMAT_BGRA32, 5, 3);
   mask.Fill(255);
-  TestPicture output(N3DS_FORMAT_NV21, 5, 3);
+  TestImage output(N3DS_FORMAT_NV21, 5, 3);
   output.Fill(9);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), output.get()), N3DS_OK);
   for (int y = 0; y < 3; ++y) EXPECT_EQ(*output.At(0, 4, y), 9);
@@ -335,8 +335,8 @@ TEST(MaskBlend, TrailingOddRowAndColumnOfATwoPlanePictureStay) {
   EXPECT_NE(*output.At(0, 0, 0), 9);
 }
 
-TEST(MaskBlend, OneRowOfATwoPlanePictureIsLeftAlone) {
-  TestPicture image(N3DS_FORMAT_NV21, 8, 1), mask(N3DS_FORMAT_BGRA32, 8, 1);
+TEST(MaskBlend, OneRowOfATwoPlaneImageIsLeftAlone) {
+  TestImage image(N3DS_FORMAT_NV21, 8, 1), mask(N3DS_FORMAT_BGRA32, 8, 1);
   mask.Fill(255);
   const auto before = image.Bytes();
   EXPECT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), mask.get(), image.get()), N3DS_OK);
@@ -346,8 +346,8 @@ TEST(MaskBlend, OneRowOfATwoPlanePictureIsLeftAlone) {
 // The packed format goes by the mask's size, so a smaller mask leaves the rest of the output as it
 // was; the two-plane format goes by the image's.
 TEST(MaskBlend, PackedFormatWalksTheMaskTwoPlaneFormatTheImage) {
-  TestPicture image(N3DS_FORMAT_BGR24, 6, 4), output(N3DS_FORMAT_BGR24, 6, 4);
-  TestPicture small(N3DS_FORMAT_BGRA32, 3, 2);
+  TestImage image(N3DS_FORMAT_BGR24, 6, 4), output(N3DS_FORMAT_BGR24, 6, 4);
+  TestImage small(N3DS_FORMAT_BGRA32, 3, 2);
   image.Fill(50);
   output.Fill(9);
   ASSERT_EQ(N3DS_BlendFaceMask(nullptr, image.get(), small.get(), output.get()), N3DS_OK);
@@ -357,8 +357,8 @@ TEST(MaskBlend, PackedFormatWalksTheMaskTwoPlaneFormatTheImage) {
     }
   }
 
-  TestPicture yuv(N3DS_FORMAT_NV21, 2, 2), yuv_output(N3DS_FORMAT_NV21, 6, 4);
-  TestPicture large(N3DS_FORMAT_BGRA32, 6, 4);
+  TestImage yuv(N3DS_FORMAT_NV21, 2, 2), yuv_output(N3DS_FORMAT_NV21, 6, 4);
+  TestImage large(N3DS_FORMAT_BGRA32, 6, 4);
   large.Fill(255);
   yuv.Fill(128);
   yuv_output.Fill(9);
@@ -370,10 +370,10 @@ TEST(MaskBlend, PackedFormatWalksTheMaskTwoPlaneFormatTheImage) {
   }
 }
 
-// Every alpha with every image and mask level, as one picture per alpha.
+// Every alpha with every image and mask level, as one image per alpha.
 TEST(MaskBlend, EveryAlphaWithEveryPairOfLevels) {
-  TestPicture image(N3DS_FORMAT_BGR24, 256, 256), mask(N3DS_FORMAT_BGRA32, 256, 256);
-  TestPicture output(N3DS_FORMAT_BGR24, 256, 256), expected(N3DS_FORMAT_BGR24, 256, 256);
+  TestImage image(N3DS_FORMAT_BGR24, 256, 256), mask(N3DS_FORMAT_BGRA32, 256, 256);
+  TestImage output(N3DS_FORMAT_BGR24, 256, 256), expected(N3DS_FORMAT_BGR24, 256, 256);
   for (int alpha = 0; alpha < 256; alpha += 5) {
     for (int y = 0; y < 256; ++y) {
       for (int x = 0; x < 256; ++x) {

@@ -11,7 +11,7 @@
 
 #include "core/model_tables.h"
 #include "core/tracking_context.h"
-#include "mask/test_picture.h"
+#include "mask/test_image.h"
 #include "mask/warp_scene.h"
 #include "norvale_3d_sticker_core.h"
 #include "support/null_arguments.h"
@@ -48,15 +48,15 @@ class MaskWarp : public ::testing::Test {
     return N3DS_WarpFaceMask(context_.get(), &mask, output, &model, width, height, face);
   }
 
-  TestPicture Expected(int width, int height, int padding = 0) {
-    TestPicture expected(N3DS_FORMAT_BGRA32, width, height, padding);
+  TestImage Expected(int width, int height, int padding = 0) {
+    TestImage expected(N3DS_FORMAT_BGRA32, width, height, padding);
     scene_.DrawReference(texture_, expected);
     return expected;
   }
 
   std::unique_ptr<TrackingContext> context_;
   WarpScene scene_;
-  TestPicture texture_;
+  TestImage texture_;
 };
 
 bool AllZero(const std::vector<uint8_t>& bytes) {
@@ -82,7 +82,7 @@ TEST_F(MaskWarp, MakesAnOutputOfTheGivenSize) {
 
 TEST_F(MaskWarp, DrawsIntoTheCallersOutputByItsOwnSize) {
   Random random = TestRandom();
-  TestPicture output(N3DS_FORMAT_BGRA32, 9, 7, 6);
+  TestImage output(N3DS_FORMAT_BGRA32, 9, 7, 6);
   output.Randomise(random);
   output.get()->pixelFormat = 4711;
   output.get()->pitch[1] = -5;
@@ -134,7 +134,7 @@ TEST_F(MaskWarp, SizesBeyondThePoolsOrThePitchsRangeAreOutOfMemory) {
 }
 
 TEST_F(MaskWarp, RejectsNullArgumentsAndLeavesTheOutputAlone) {
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
   output.Fill(7);
   const auto before = output.Bytes();
   const N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
@@ -150,7 +150,7 @@ TEST_F(MaskWarp, RejectsNullArgumentsAndLeavesTheOutputAlone) {
 }
 
 TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
   output.Fill(7);
   const auto before = output.Bytes();
   EXPECT_EQ(Warp(output.get(), 0, 12), N3DS_BAD_VALUE);
@@ -164,17 +164,17 @@ TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
   EXPECT_EQ(Warp(output.get(), 16, 12, 0), N3DS_BAD_VALUE);
   context_->faceNum = 2;
 
-  NSVL_OFFSCREEN& picture = *texture_.get();
-  const NSVL_OFFSCREEN good = picture;
+  NSVL_OFFSCREEN& image = *texture_.get();
+  const NSVL_OFFSCREEN good = image;
   for (int field = 0; field < 7; ++field) {
-    picture = good;
-    if (field == 0) picture.plane[0] = nullptr;
-    if (field == 1) picture.width = 0;
-    if (field == 2) picture.height = 0;
-    if (field == 3) picture.width = -32;
-    if (field == 4) picture.pixelFormat = N3DS_FORMAT_BGR24;
-    if (field == 5) picture.pixelFormat = N3DS_FORMAT_NV21;
-    if (field == 6) picture.pitch[0] *= -1;
+    image = good;
+    if (field == 0) image.plane[0] = nullptr;
+    if (field == 1) image.width = 0;
+    if (field == 2) image.height = 0;
+    if (field == 3) image.width = -32;
+    if (field == 4) image.pixelFormat = N3DS_FORMAT_BGR24;
+    if (field == 5) image.pixelFormat = N3DS_FORMAT_NV21;
+    if (field == 6) image.pitch[0] *= -1;
     EXPECT_EQ(Warp(output.get()), N3DS_BAD_VALUE) << field;
     NSVL_OFFSCREEN none = {};
     EXPECT_EQ(Warp(&none), N3DS_BAD_VALUE) << field;
@@ -185,7 +185,7 @@ TEST_F(MaskWarp, RejectsBadValuesAndLeavesTheOutputAlone) {
 }
 
 TEST_F(MaskWarp, RejectsMeshIndicesWithoutAVertex) {
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
   output.Fill(7);
   const auto before = output.Bytes();
   const N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
@@ -205,7 +205,7 @@ TEST_F(MaskWarp, RejectsMeshIndicesWithoutAVertex) {
 }
 
 TEST_F(MaskWarp, WrongTextureCountsGiveAClearOutput) {
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12, 4);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12, 4);
   output.Fill(7);
   N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
   mask.texCoordCount = 1811;
@@ -216,7 +216,7 @@ TEST_F(MaskWarp, WrongTextureCountsGiveAClearOutput) {
 
 TEST_F(MaskWarp, FaceThatWasNeverTrackedGivesAClearOutput) {
   context_->trackFlag[1] = 0;
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12, 4);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12, 4);
   output.Fill(7);
   EXPECT_EQ(Warp(output.get(), 16, 12, 1), N3DS_OK);
   EXPECT_TRUE(AllZero(output.Bytes()));
@@ -227,7 +227,7 @@ TEST_F(MaskWarp, FaceThatWasNeverTrackedGivesAClearOutput) {
 // Its model record may not have been filled.
 TEST_F(MaskWarp, FaceThatWasNeverTrackedNeedsNoMesh) {
   context_->trackFlag[0] = 0;
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
   output.Fill(7);
   const N3DS_2D_TEXTURE_MASK mask = scene_.Mask(texture_);
   const N3DS_3D_MODEL empty = {};
@@ -237,7 +237,7 @@ TEST_F(MaskWarp, FaceThatWasNeverTrackedNeedsNoMesh) {
 
 TEST_F(MaskWarp, EachFaceIsDrawnWithItsOwnPose) {
   context_->maskPose[1][3] += 3.0f;
-  TestPicture first(N3DS_FORMAT_BGRA32, 20, 12), second(N3DS_FORMAT_BGRA32, 20, 12);
+  TestImage first(N3DS_FORMAT_BGRA32, 20, 12), second(N3DS_FORMAT_BGRA32, 20, 12);
   ASSERT_EQ(Warp(first.get(), 20, 12, 0), N3DS_OK);
   ASSERT_EQ(Warp(second.get(), 20, 12, 1), N3DS_OK);
   for (int y = 0; y < 12; ++y) {
@@ -251,7 +251,7 @@ TEST_F(MaskWarp, TheContextAndTheInputsAreOnlyRead) {
   const std::vector<uint8_t> before(reinterpret_cast<uint8_t*>(context_.get()),
                                     reinterpret_cast<uint8_t*>(context_.get() + 1));
   const auto texture_before = texture_.Bytes();
-  TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+  TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
   ASSERT_EQ(Warp(output.get()), N3DS_OK);
   EXPECT_EQ(std::memcmp(before.data(), context_.get(), before.size()), 0);
   EXPECT_EQ(texture_.Bytes(), texture_before);
@@ -271,14 +271,14 @@ TEST_F(MaskWarp, PosesThatAreNoNumbersGiveAClearOutput) {
   for (int i = 0; i < 12; ++i) {
     SetPose();
     context_->maskPose[0][i] = std::numeric_limits<float>::quiet_NaN();
-    TestPicture output(N3DS_FORMAT_BGRA32, 16, 12);
+    TestImage output(N3DS_FORMAT_BGRA32, 16, 12);
     output.Fill(7);
     EXPECT_EQ(Warp(output.get()), N3DS_OK);
     EXPECT_TRUE(AllZero(output.Bytes())) << i;
   }
 }
 
-// The shipped face, seen from the front, with its own layout: an oval in the middle of the picture,
+// The shipped face, seen from the front, with its own layout: an oval in the middle of the image,
 // its left cheek left of its right one.
 TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
   std::ifstream file(std::string(N3DS_SOURCE_DIR) + "/data/face_model.bin", std::ios::binary);
@@ -295,7 +295,7 @@ TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
   // The camera looks along -z of the model and has its y downwards.
   scene_.camera = {{560, 0, 320, 0, 560, 240, 0, 0, 1}, {1, 0, 0, 0, -1, 0, 0, 0, -1}, {0, 0, 500}};
   SetPose();
-  TestPicture texture(N3DS_FORMAT_BGRA32, 512, 512);
+  TestImage texture(N3DS_FORMAT_BGRA32, 512, 512);
   for (int y = 0; y < 512; ++y) {
     for (int x = 0; x < 512; ++x) {
       uint8_t* pixel = texture.Pixel(x, y);
@@ -305,7 +305,7 @@ TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
     }
   }
   const N3DS_2D_TEXTURE_MASK mask = {nullptr, 0, nullptr, 0, texture.descriptor()};
-  TestPicture output(N3DS_FORMAT_BGRA32, 640, 480);
+  TestImage output(N3DS_FORMAT_BGRA32, 640, 480);
   ASSERT_EQ(N3DS_WarpFaceMask(context_.get(), &mask, output.get(), &model, 640, 480, 0), N3DS_OK);
 
   int covered = 0;
@@ -326,7 +326,7 @@ TEST_F(MaskWarp, ShippedFaceShowsTheWholeTexture) {
   EXPECT_GT(covered, 15000);
   EXPECT_LT(covered, 50000);
   EXPECT_GT(mean_x[1] / count_x[1], mean_x[0] / count_x[0] + 20) << "u grows to the right";
-  EXPECT_GT(mean_y[1] / count_y[1], mean_y[0] / count_y[0] + 20) << "v of the picture grows down";
+  EXPECT_GT(mean_y[1] / count_y[1], mean_y[0] / count_y[0] + 20) << "v of the image grows down";
 }
 
 }  // namespace

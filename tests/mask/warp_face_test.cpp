@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "core/model_tables.h"
-#include "mask/test_picture.h"
+#include "mask/test_image.h"
 #include "mask/warp_scene.h"
 #include "support/test_random.h"
 namespace n3ds::testing {
@@ -21,20 +21,20 @@ namespace {
 constexpr float kNan = std::numeric_limits<float>::quiet_NaN();
 constexpr float kInfinity = std::numeric_limits<float>::infinity();
 
-MRESULT Draw(WarpScene& scene, TestPicture& texture, TestPicture& output) {
+MRESULT Draw(WarpScene& scene, TestImage& texture, TestImage& output) {
   const N3DS_3D_MODEL model = scene.Model();
   const N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
   return WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor());
 }
 
-TestPicture Canvas(int width, int height, int padding = 0) {
-  return TestPicture(N3DS_FORMAT_BGRA32, width, height, padding);
+TestImage Canvas(int width, int height, int padding = 0) {
+  return TestImage(N3DS_FORMAT_BGRA32, width, height, padding);
 }
 
 using Pixels = std::set<std::pair<int, int>>;
 
 // Pixels (x, y) that something was drawn on, by their alpha.
-Pixels Covered(TestPicture& output) {
+Pixels Covered(TestImage& output) {
   Pixels covered;
   for (int y = 0; y < output.height(); ++y) {
     for (int x = 0; x < output.width(); ++x) {
@@ -44,9 +44,9 @@ Pixels Covered(TestPicture& output) {
   return covered;
 }
 
-void ExpectLikeReference(WarpScene& scene, TestPicture& texture, TestPicture& output,
+void ExpectLikeReference(WarpScene& scene, TestImage& texture, TestImage& output,
                          const char* what) {
-  TestPicture expected(output);
+  TestImage expected(output);
   scene.DrawReference(texture, expected);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   ASSERT_EQ(output.Bytes(), expected.Bytes()) << what;
@@ -59,7 +59,7 @@ void ExpectLikeReference(WarpScene& scene, TestPicture& texture, TestPicture& ou
 TEST(WarpFace, RightTriangleLeavesItsBottomRowOut) {
   WarpScene scene;
   scene.Add({{{4, 0, 0.5f, 1}, {0, 4, 0, 0.5f}, {0, 0, 0, 1}}});
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(8, 8);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(8, 8);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   const Pixels expected = {{0, 0}, {1, 0}, {2, 0}, {3, 0}, {0, 1},
                            {1, 1}, {2, 1}, {0, 2}, {1, 2}, {0, 3}};
@@ -71,7 +71,7 @@ TEST(WarpFace, RightTriangleLeavesItsBottomRowOut) {
 TEST(WarpFace, EdgeOppositeToTheFirstCornerKeepsPixelsThatItTouches) {
   WarpScene scene;
   scene.Add({{{0, 0, 0, 1}, {4, 0, 0.5f, 1}, {0, 4, 0, 0.5f}}});
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(8, 8);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(8, 8);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   const Pixels expected = {{0, 0}, {1, 0}, {2, 0}, {3, 0}, {0, 1}, {1, 1}, {2, 1},
                            {3, 1}, {0, 2}, {1, 2}, {2, 2}, {0, 3}, {1, 3}};
@@ -81,7 +81,7 @@ TEST(WarpFace, EdgeOppositeToTheFirstCornerKeepsPixelsThatItTouches) {
 TEST(WarpFace, PointedTriangleCoversBothItsParts) {
   WarpScene scene;
   scene.Add({{{10, 5, 0.5f, 0.7f}, {5, 10, 0, 0.5f}, {5, 0, 0, 1}}});
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(12, 12);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(12, 12);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   Pixels expected;
   for (int y = 0; y < 10; ++y) {
@@ -93,14 +93,14 @@ TEST(WarpFace, PointedTriangleCoversBothItsParts) {
 TEST(WarpFace, TriangleWithinOneRowIsDrawnAsSpans) {
   WarpScene scene;
   scene.Add({{{1.2f, 1.6f, 0, 1}, {7.2f, 1.6f, 0.5f, 1}, {4.0f, 2.4f, 0.2f, 0.5f}}});
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(10, 5);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(10, 5);
   ExpectLikeReference(scene, texture, output, "one row");
   for (const auto& [x, y] : Covered(output)) EXPECT_EQ(y, 2) << x;
   EXPECT_FALSE(Covered(output).empty());
 }
 
 TEST(WarpFace, TrianglesWithoutAreaDrawNothing) {
-  TestPicture texture = GradientTexture(32, 32);
+  TestImage texture = GradientTexture(32, 32);
   const std::array<WarpCorner, 3> flat[] = {
       {{{3, 3, 0, 0}, {3, 3, 1, 0}, {3, 3, 0, 1}}},
       {{{1, 1, 0, 0}, {3, 3, 1, 0}, {6, 6, 0, 1}}},
@@ -110,7 +110,7 @@ TEST(WarpFace, TrianglesWithoutAreaDrawNothing) {
   for (const auto& corners : flat) {
     WarpScene scene;
     scene.Add(corners);
-    TestPicture output = Canvas(10, 10);
+    TestImage output = Canvas(10, 10);
     ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
     EXPECT_TRUE(Covered(output).empty());
   }
@@ -119,7 +119,7 @@ TEST(WarpFace, TrianglesWithoutAreaDrawNothing) {
 TEST(WarpFace, RectangleIsCoveredWithoutGaps) {
   WarpScene scene;
   scene.AddRectangle(3, 2, 23, 17);
-  TestPicture texture = GradientTexture(64, 64), output = Canvas(30, 20);
+  TestImage texture = GradientTexture(64, 64), output = Canvas(30, 20);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   for (int y = 0; y < 20; ++y) {
     for (int x = 0; x < 30; ++x) {
@@ -133,7 +133,7 @@ TEST(WarpFace, RectangleIsCoveredWithoutGaps) {
 }
 
 TEST(WarpFace, LaterTrianglesCoverEarlierOnes) {
-  TestPicture texture = Canvas(16, 16);
+  TestImage texture = Canvas(16, 16);
   for (int y = 0; y < 16; ++y) {
     for (int x = 0; x < 16; ++x) {
       texture.Pixel(x, y)[0] = x < 8 ? 10 : 200;
@@ -143,7 +143,7 @@ TEST(WarpFace, LaterTrianglesCoverEarlierOnes) {
   WarpScene scene;
   scene.Add({{{0, 0, 0, 1}, {12, 0, 0.2f, 1}, {0, 12, 0, 0.8f}}});
   scene.Add({{{0, 0, 0.7f, 1}, {6, 0, 0.8f, 1}, {0, 6, 0.7f, 0.8f}}});
-  TestPicture output = Canvas(16, 16);
+  TestImage output = Canvas(16, 16);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   EXPECT_EQ(output.Pixel(1, 1)[0], 200);
   EXPECT_EQ(output.Pixel(4, 4)[0], 10);
@@ -161,7 +161,7 @@ TEST(WarpFace, EnlargedGradientStaysLinear) {
     scene.coordinate(i)[0] *= 0.9f;
     scene.coordinate(i)[1] = 0.1f + 0.9f * scene.coordinate(i)[1];
   }
-  TestPicture texture = GradientTexture(100, 120), output = Canvas(320, 256);
+  TestImage texture = GradientTexture(100, 120), output = Canvas(320, 256);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   int drawn = 0;
   for (int y = 6; y < 243; ++y) {
@@ -178,7 +178,7 @@ TEST(WarpFace, EnlargedGradientStaysLinear) {
 }
 
 TEST(WarpFace, AlphaIsSampledLikeTheColours) {
-  TestPicture texture = Canvas(16, 16);
+  TestImage texture = Canvas(16, 16);
   for (int y = 0; y < 16; ++y) {
     for (int x = 0; x < 16; ++x) {
       for (int c = 0; c < 4; ++c) texture.Pixel(x, y)[c] = static_cast<uint8_t>(13 * x + y + 9);
@@ -186,7 +186,7 @@ TEST(WarpFace, AlphaIsSampledLikeTheColours) {
   }
   WarpScene scene;
   scene.AddRectangle(1, 1, 40, 30);
-  TestPicture output = Canvas(48, 32);
+  TestImage output = Canvas(48, 32);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   for (int y = 0; y < 32; ++y) {
     for (int x = 0; x < 48; ++x) {
@@ -198,13 +198,13 @@ TEST(WarpFace, AlphaIsSampledLikeTheColours) {
 
 // Columns of one colour each: where all corners have the same u, the sample is that very column.
 uint8_t ColumnSampledAt(float u, int width) {
-  TestPicture texture = Canvas(width, 8);
+  TestImage texture = Canvas(width, 8);
   for (int y = 0; y < 8; ++y) {
     for (int x = 0; x < width; ++x) texture.Pixel(x, y)[3] = static_cast<uint8_t>(x + 1);
   }
   WarpScene scene;
   scene.Add({{{0, 0, u, 0.5f}, {8, 0, u, 0.5f}, {0, 8, u, 0.5f}}});
-  TestPicture output = Canvas(10, 10);
+  TestImage output = Canvas(10, 10);
   EXPECT_EQ(Draw(scene, texture, output), N3DS_OK);
   return output.Pixel(2, 2)[3];
 }
@@ -221,14 +221,14 @@ TEST(WarpFace, CoordinatesAtTheBorderAreClampedThreePixelsIn) {
 }
 
 TEST(WarpFace, TextureRunsUpwards) {
-  TestPicture texture = Canvas(16, 16);
+  TestImage texture = Canvas(16, 16);
   for (int x = 0; x < 16; ++x) {
     for (int y = 0; y < 16; ++y) texture.Pixel(x, y)[3] = static_cast<uint8_t>(10 * y + 1);
   }
   WarpScene scene;
   scene.Add({{{0, 0, 0.2f, 1}, {8, 0, 0.4f, 1}, {0, 8, 0.2f, 1}}});
   scene.Add({{{20, 0, 0.2f, 0.25f}, {28, 0, 0.4f, 0.25f}, {20, 8, 0.2f, 0.25f}}});
-  TestPicture output = Canvas(30, 10);
+  TestImage output = Canvas(30, 10);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   EXPECT_EQ(output.Pixel(2, 2)[3], 1) << "v = 1 is the first row";
   EXPECT_EQ(output.Pixel(22, 2)[3], 121) << "v = 0.25 is row 12 of 16";
@@ -239,9 +239,9 @@ TEST(WarpFace, TexturesTooSmallToBlendDrawNothing) {
   for (const auto& [width, height] : {std::pair(1, 1), {1, 9}, {9, 1}, {2, 9}, {9, 2}, {2, 2}}) {
     WarpScene scene;
     scene.AddRectangle(1, 1, 20, 20);
-    TestPicture texture = Canvas(width, height);
+    TestImage texture = Canvas(width, height);
     texture.Fill(255);
-    TestPicture output = Canvas(24, 24);
+    TestImage output = Canvas(24, 24);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "small texture"));
     if (width == 1 || height == 1) {
       EXPECT_TRUE(Covered(output).empty());
@@ -252,17 +252,17 @@ TEST(WarpFace, TexturesTooSmallToBlendDrawNothing) {
 TEST(WarpFace, TexturesOfThreePixelsShowTheirFirst) {
   WarpScene scene;
   scene.AddRectangle(1, 1, 20, 20);
-  TestPicture texture = Canvas(3, 3);
+  TestImage texture = Canvas(3, 3);
   texture.Fill(9);
   for (int c = 0; c < 4; ++c) texture.Pixel(0, 0)[c] = 200;
-  TestPicture output = Canvas(24, 24);
+  TestImage output = Canvas(24, 24);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   EXPECT_EQ(output.Pixel(10, 10)[0], 200);
 }
 
 // ---- Against the reference
 
-// Coordinates on whole, half and arbitrary positions, inside and around the picture.
+// Coordinates on whole, half and arbitrary positions, inside and around the image.
 float RandomCoordinate(int size, Random& random) {
   const float value =
       random.Float(-0.3f * static_cast<float>(size), 1.3f * static_cast<float>(size));
@@ -281,7 +281,7 @@ TEST(WarpFace, RandomTrianglesMatchTheReference) {
   const auto uv = [&random] { return random.Float(-0.2f, 1.2f); };
   for (int run = 0; run < 300; ++run) {
     const int width = 1 + random.Int(0, 39), height = 1 + random.Int(0, 29);
-    TestPicture texture = Canvas(1 + random.Int(0, 19), 1 + random.Int(0, 19), random.Int(0, 2));
+    TestImage texture = Canvas(1 + random.Int(0, 19), 1 + random.Int(0, 19), random.Int(0, 2));
     texture.Randomise(random);
     WarpScene scene;
     for (int i = 0; i < 12; ++i) {
@@ -293,19 +293,19 @@ TEST(WarpFace, RandomTrianglesMatchTheReference) {
       if (i % 4 == 2) corners[2].x = corners[0].x + 0.01f * uv();  // thin
       scene.Add(corners);
     }
-    TestPicture output = Canvas(width, height, random.Int(0, 3));
+    TestImage output = Canvas(width, height, random.Int(0, 3));
     output.Randomise(random);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "random triangles")) << run;
   }
 }
 
 // Triangles of about a pixel: corners share pixels and rows, and their order decides the spans.
-// Twenty a picture, four columns apart, because drawing goes over all 3456 triangles of the mesh.
+// Twenty an image, four columns apart, because drawing goes over all 3456 triangles of the mesh.
 TEST(WarpFace, TinyTrianglesMatchTheReference) {
   Random random = TestRandom();
   const auto place = [&random] { return random.Float(0.0f, 1.6f); };
   const auto uv = [&random] { return random.Float(0.0f, 1.0f); };
-  TestPicture texture = GradientTexture(20, 20);
+  TestImage texture = GradientTexture(20, 20);
   for (int run = 0; run < 100; ++run) {
     WarpScene scene;
     for (int i = 0; i < 20; ++i) {
@@ -315,7 +315,7 @@ TEST(WarpFace, TinyTrianglesMatchTheReference) {
       }
       scene.Add(corners);
     }
-    TestPicture output = Canvas(80, 3);
+    TestImage output = Canvas(80, 3);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "tiny")) << run;
   }
 }
@@ -323,7 +323,7 @@ TEST(WarpFace, TinyTrianglesMatchTheReference) {
 TEST(WarpFace, SliversAcrossPixelEdgesMatchTheReference) {
   Random random = TestRandom();
   const auto place = [&random] { return random.Float(0.0f, 19.0f); };
-  TestPicture texture = GradientTexture(20, 20);
+  TestImage texture = GradientTexture(20, 20);
   for (int run = 0; run < 300; ++run) {
     WarpScene scene;
     for (int i = 0; i < 10; ++i) {
@@ -334,7 +334,7 @@ TEST(WarpFace, SliversAcrossPixelEdgesMatchTheReference) {
                   {place(), y, 0.8f, 0.9f},
                   {place(), place(), 0.3f, 0.2f}}});
     }
-    TestPicture output = Canvas(20, 20);
+    TestImage output = Canvas(20, 20);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "slivers")) << run;
   }
 }
@@ -343,7 +343,7 @@ TEST(WarpFace, PosedMeshWithAFullCameraMatchesTheReference) {
   Random random = TestRandom();
   const auto place = [&random] { return random.Float(-60.0f, 60.0f); };
   const auto uv = [&random] { return random.Float(0.0f, 1.0f); };
-  TestPicture texture = GradientTexture(50, 40);
+  TestImage texture = GradientTexture(50, 40);
   for (int run = 0; run < 40; ++run) {
     WarpScene scene;
     for (int i = 0; i < 30; ++i) {
@@ -358,7 +358,7 @@ TEST(WarpFace, PosedMeshWithAFullCameraMatchesTheReference) {
     scene.camera = {{110, 7, 52, -3, 95, 41, kNan, kNan, kNan},
                     {c, 0, s, 0.1f, 1, 0, -s, 0, c},
                     {2, -3, 70 + 2 * place()}};
-    TestPicture output = Canvas(101, 77);
+    TestImage output = Canvas(101, 77);
     ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "posed mesh")) << run;
   }
 }
@@ -368,7 +368,7 @@ TEST(WarpFace, PosedMeshWithAFullCameraMatchesTheReference) {
 TEST(WarpFace, RefusesALayoutOfOtherCounts) {
   WarpScene scene;
   scene.AddRectangle(1, 1, 8, 8);
-  TestPicture texture = GradientTexture(16, 16), output = Canvas(10, 10);
+  TestImage texture = GradientTexture(16, 16), output = Canvas(10, 10);
   const N3DS_3D_MODEL model = scene.Model();
   for (const auto& [coordinates, triangles] : {std::pair<int64_t, int64_t>(1811, 3456),
                                                {1813, 3456},
@@ -399,8 +399,8 @@ TEST(WarpFace, MissingArrayBringsTheDefaultLayoutWhateverTheCounts) {
   }
   const N3DS_3D_MODEL model = {vertices.data(), 0, &kTriangles[0][0], 0};
   WarpScene scene;
-  TestPicture texture = GradientTexture(64, 64);
-  TestPicture expected = Canvas(80, 90);
+  TestImage texture = GradientTexture(64, 64);
+  TestImage expected = Canvas(80, 90);
   WarpReference(vertices.data(), model.triangles, upward.data(), model.triangles, scene.camera,
                 texture, expected);
   ASSERT_GT(Covered(expected).size(), 2000u);
@@ -410,7 +410,7 @@ TEST(WarpFace, MissingArrayBringsTheDefaultLayoutWhateverTheCounts) {
     mask.texCoordCount = mask.triangleCount = -7;
     if (missing != 1) mask.texCoords = nullptr;
     if (missing != 0) mask.triangles = nullptr;
-    TestPicture output = Canvas(80, 90);
+    TestImage output = Canvas(80, 90);
     ASSERT_EQ(
         WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
         N3DS_OK);
@@ -432,14 +432,14 @@ TEST(WarpFace, TextureAndMeshMayBeCutDifferently) {
   turned[0] = 3;
   turned[1] = 1;
   turned[2] = 2;
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(16, 16);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(16, 16);
   const N3DS_3D_MODEL model = scene.Model();
   N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
   mask.triangles = turned.data();
   ASSERT_EQ(
       WarpFace(model, mask, scene.camera.K, scene.camera.R, scene.camera.t, output.descriptor()),
       N3DS_OK);
-  TestPicture expected = Canvas(16, 16);
+  TestImage expected = Canvas(16, 16);
   WarpReference(model.vertices, model.triangles, mask.texCoords, turned.data(), scene.camera,
                 texture, expected);
   EXPECT_EQ(output.Bytes(), expected.Bytes());
@@ -452,7 +452,7 @@ TEST(WarpFace, TextureTrianglesBeyondTheCoordinatesAreLeftOut) {
   std::vector<uint16_t> triangles(3 * N3DS_TRIANGLE_COUNT, 1);
   triangles[0] = N3DS_VERTEX_COUNT;
   triangles[4] = UINT16_MAX;
-  TestPicture texture = GradientTexture(16, 16), output = Canvas(10, 10);
+  TestImage texture = GradientTexture(16, 16), output = Canvas(10, 10);
   const N3DS_3D_MODEL model = scene.Model();
   N3DS_2D_TEXTURE_MASK mask = scene.Mask(texture);
   mask.triangles = triangles.data();
@@ -462,25 +462,25 @@ TEST(WarpFace, TextureTrianglesBeyondTheCoordinatesAreLeftOut) {
   EXPECT_TRUE(Covered(output).empty());
 }
 
-// ---- Odd poses and pictures
+// ---- Odd poses and images
 
 TEST(WarpFace, CornerInTheCameraPlaneIsDrawnAtTheOrigin) {
   WarpScene scene;
   const int first = scene.Add({{{9, 9, 0, 1}, {12, 0, 0.8f, 1}, {0, 12, 0, 0.2f}}});
   scene.vertex(first)[2] = 0.0f;
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(16, 16);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(16, 16);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
 
   WarpScene same;
   same.Add({{{0, 0, 0, 1}, {12, 0, 0.8f, 1}, {0, 12, 0, 0.2f}}});
-  TestPicture expected = Canvas(16, 16);
+  TestImage expected = Canvas(16, 16);
   ASSERT_EQ(Draw(same, texture, expected), N3DS_OK);
   EXPECT_FALSE(Covered(expected).empty());
   EXPECT_EQ(output.Bytes(), expected.Bytes());
 }
 
 TEST(WarpFace, PosesThatAreNoNumbersDrawNothing) {
-  TestPicture texture = GradientTexture(32, 32);
+  TestImage texture = GradientTexture(32, 32);
   for (int part = 0; part < 18; ++part) {
     for (const float value : {kNan, kInfinity, -kInfinity}) {
       WarpScene scene;
@@ -489,7 +489,7 @@ TEST(WarpFace, PosesThatAreNoNumbersDrawNothing) {
                       : part < 12 ? &scene.camera.t[part - 9]
                                   : &scene.camera.K[part - 12];
       *target = value;
-      TestPicture output = Canvas(16, 16);
+      TestImage output = Canvas(16, 16);
       ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "pose")) << part;
       if (std::isnan(value)) {
         EXPECT_TRUE(Covered(output).empty()) << part;
@@ -503,7 +503,7 @@ TEST(WarpFace, VerticesThatAreNoNumbersCostOnlyTheirTriangle) {
   const int first = scene.Add({{{0, 0, 0, 1}, {12, 0, 0.8f, 1}, {0, 12, 0, 0.2f}}});
   scene.Add({{{20, 0, 0, 1}, {30, 0, 0.8f, 1}, {20, 10, 0, 0.2f}}});
   scene.vertex(first + 1)[1] = kNan;
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(32, 16);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(32, 16);
   ASSERT_EQ(Draw(scene, texture, output), N3DS_OK);
   EXPECT_EQ(Covered(output).count({2, 2}), 0u);
   EXPECT_EQ(Covered(output).count({22, 2}), 1u);
@@ -512,7 +512,7 @@ TEST(WarpFace, VerticesThatAreNoNumbersCostOnlyTheirTriangle) {
 TEST(WarpFace, TextureCoordinatesThatAreNoNumbersGiveZeroBytes) {
   WarpScene scene;
   scene.Add({{{0, 0, kNan, 1}, {12, 0, 0.8f, kNan}, {0, 12, 0, 0.2f}}});
-  TestPicture texture = GradientTexture(32, 32), output = Canvas(16, 16);
+  TestImage texture = GradientTexture(32, 32), output = Canvas(16, 16);
   output.Fill(7);
   ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "coordinates"));
   EXPECT_EQ(output.Pixel(2, 2)[0], 0);
@@ -521,7 +521,7 @@ TEST(WarpFace, TextureCoordinatesThatAreNoNumbersGiveZeroBytes) {
 
 TEST(WarpFace, FacesPartlyAndWhollyOutsideStayInsideTheBuffer) {
   Random random = TestRandom();
-  TestPicture texture = GradientTexture(32, 32);
+  TestImage texture = GradientTexture(32, 32);
   for (const auto& [x, y] : {std::pair(-30.0f, 5.0f),
                              {25.0f, 5.0f},
                              {5.0f, -30.0f},
@@ -533,7 +533,7 @@ TEST(WarpFace, FacesPartlyAndWhollyOutsideStayInsideTheBuffer) {
     for (const auto& [width, height] : {std::pair(31, 27), {1, 1}, {1, 27}, {31, 1}, {2, 2}}) {
       WarpScene scene;
       scene.AddRectangle(x, y, x + 20, y + 20);
-      TestPicture output = Canvas(width, height);
+      TestImage output = Canvas(width, height);
       output.Randomise(random);
       ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "outside"))
           << x << ", " << y << " in " << width << " x " << height;
@@ -541,12 +541,12 @@ TEST(WarpFace, FacesPartlyAndWhollyOutsideStayInsideTheBuffer) {
   }
 }
 
-TEST(WarpFace, FaceAroundTheWholePictureFillsIt) {
+TEST(WarpFace, FaceAroundTheWholeImageFillsIt) {
   WarpScene scene;
   scene.AddRectangle(-500, -400, 700, 800);
-  TestPicture texture = GradientTexture(64, 64), output = Canvas(33, 21);
+  TestImage texture = GradientTexture(64, 64), output = Canvas(33, 21);
   ASSERT_NO_FATAL_FAILURE(ExpectLikeReference(scene, texture, output, "around"));
-  // The clamp pulls the corners to the picture's last row, and a bottom row is not drawn.
+  // The clamp pulls the corners to the image's last row, and a bottom row is not drawn.
   EXPECT_EQ(Covered(output).size(), 33u * 20u);
 }
 
@@ -554,7 +554,7 @@ TEST(WarpFace, FaceAroundTheWholePictureFillsIt) {
 TEST(WarpFace, RowsShorterThanTheWidthAreNotOverrun) {
   WarpScene scene;
   scene.Add({{{2, 15, 0.5f, 0.5f}, {15, 15, 0.5f, 0.5f}, {8, 14.6f, 0.5f, 0.5f}}});
-  TestPicture texture = GradientTexture(32, 32), narrow = Canvas(9, 16);
+  TestImage texture = GradientTexture(32, 32), narrow = Canvas(9, 16);
   NSVL_OFFSCREEN output = narrow.descriptor();
   output.width = 16;
   const N3DS_3D_MODEL model = scene.Model();

@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: MIT
 // The mask warp written down once more, as slowly and plainly as it can be: every span of a
-// triangle is listed first, then every pixel of the picture is asked whether it lies in one.
+// triangle is listed first, then every pixel of the image is asked whether it lies in one.
 #pragma once
 
 #include <cmath>
 #include <cstdint>
 #include <vector>
 
-#include "mask/test_picture.h"
+#include "mask/test_image.h"
 
 namespace n3ds::testing {
 
@@ -15,7 +15,7 @@ struct ReferenceCamera {
   float K[9], R[9], t[3];
 };
 
-// Integer part, as the engine converts everywhere: saturating, 0 for not-a-number.
+// Integer part, as the engine converts everywhere: saturating, 0 for NaN.
 inline int64_t Whole(float value) {
   if (std::isnan(value)) return 0;
   if (value >= 2147483648.0f) return INT32_MAX;
@@ -93,8 +93,8 @@ inline std::vector<ReferenceSpan> ReferenceSpans(const float (*image)[2], int he
 
 // `coordinates` run v upwards.
 inline void WarpReference(const float* vertices, const uint16_t* mesh, const float* coordinates,
-                          const uint16_t* layout, const ReferenceCamera& camera,
-                          TestPicture& texture, TestPicture& output) {
+                          const uint16_t* layout, const ReferenceCamera& camera, TestImage& texture,
+                          TestImage& output) {
   const float *K = camera.K, *R = camera.R, *t = camera.t;
   const int W = output.width(), H = output.height(), TW = texture.width(), TH = texture.height();
   for (int k = 0; k < 3456; ++k) {

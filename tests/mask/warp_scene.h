@@ -7,7 +7,7 @@
 #include <memory>
 #include <vector>
 
-#include "mask/test_picture.h"
+#include "mask/test_image.h"
 #include "mask/warp_reference.h"
 #include "norvale_3d_sticker_core.h"
 
@@ -59,11 +59,11 @@ class WarpScene {
   N3DS_3D_MODEL Model() {
     return {vertices_.get(), N3DS_VERTEX_COUNT, triangles_.get(), N3DS_TRIANGLE_COUNT};
   }
-  N3DS_2D_TEXTURE_MASK Mask(TestPicture& texture) {
+  N3DS_2D_TEXTURE_MASK Mask(TestImage& texture) {
     return {coordinates_.get(), N3DS_VERTEX_COUNT, triangles_.get(), N3DS_TRIANGLE_COUNT,
             texture.descriptor()};
   }
-  void DrawReference(TestPicture& texture, TestPicture& output) {
+  void DrawReference(TestImage& texture, TestImage& output) {
     WarpReference(vertices_.get(), triangles_.get(), coordinates_.get(), triangles_.get(), camera,
                   texture, output);
   }
@@ -77,8 +77,8 @@ class WarpScene {
 };
 
 // A texture whose bytes grow with the position: blue by column, green by row, alpha 255.
-inline TestPicture GradientTexture(int width, int height) {
-  TestPicture texture(N3DS_FORMAT_BGRA32, width, height);
+inline TestImage GradientTexture(int width, int height) {
+  TestImage texture(N3DS_FORMAT_BGRA32, width, height);
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
       uint8_t* pixel = texture.Pixel(x, y);

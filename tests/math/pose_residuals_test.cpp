@@ -53,7 +53,7 @@ std::vector<float> Residuals(const PoseCase& c, const Pose& pose) {
 
 enum class Line { kVertical, kHorizontal, kOblique };
 
-// Landmarks of another pose, some pixels off, with the chin put where the middle line is of the
+// Landmarks of another pose, some pixels off, with the chin put where the midline is of the
 // wanted kind.
 PoseCase RandomCase(Random& random, const Pose& pose, Line line, float error) {
   PoseCase c;
@@ -270,7 +270,7 @@ TEST(ResidualWeights, LandmarksBeyondTheLastAreOrdinary) {
 // --- Outline rule ----------------------------------------------------------------------------
 
 // One outline landmark (0, at the image left) observed `outward` pixels farther from the face's
-// middle than it projects, and `down` pixels lower, with a vertical middle line.
+// middle than it projects, and `down` pixels lower, with a vertical midline.
 struct OutlineProbe {
   PoseCase c;
   float r[2], j[2][7], plain_r[2], plain_j[2][7];
@@ -349,7 +349,7 @@ TEST(OutlineRule, ObliqueLineProjectsOntoItsNormal) {
 TEST(OutlineRule, OnlyTheEightOutermostOutlineLandmarksAreConcerned) {
   PoseCase c = ExactCase(kFrontal);
   c.landmarks[2 * 9] = static_cast<float>(ReferenceMiddleLine(c).bx);
-  // Every landmark observed nearer the middle line, a vertical one, than it projects.
+  // Every landmark observed nearer the midline, a vertical one, than it projects.
   const float middle = c.landmarks[2 * 9];
   for (int i = 0; i < kHeadPoints; ++i) {
     if (i == 9 || i == 45 || i == 51) continue;

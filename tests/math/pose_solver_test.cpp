@@ -59,7 +59,7 @@ TEST(SolveByLM, RecoversEveryKnownPoseWithoutTheOutlineRule) {
   for (int run = 0; run < 400; ++run) {
     const Pose truth = RandomPose(random);
     PoseCase c = ExactCase(truth);
-    // Up to landmark 50: too few for a middle line.
+    // Up to landmark 50: too few for a midline.
     c.landmarks.resize(2 * 51);
     c.model.resize(3 * 51);
     Pose pose = Near(random, truth, 12 * kDegree, 25);
@@ -260,7 +260,7 @@ TEST(SolveByLM, AcceptedStepsNeverRaiseTheError) {
   for (int run = 0; run < 100; ++run) {
     const Pose truth = RandomPose(random);
     PoseCase c = ExactCase(truth);
-    // Without a middle line nothing is weighted, so this error is what the solver minimises.
+    // Without a midline nothing is weighted, so this error is what the solver minimises.
     c.landmarks.resize(2 * 51);
     c.model.resize(3 * 51);
     for (float& v : c.landmarks) v += random.Float(-5, 5);

@@ -66,7 +66,7 @@ TEST(BitwiseOr, RandomSizesAndPitches) {
     const int pitch_a = width + random.Int(0, 9);
     const int pitch_b = width + random.Int(0, 9);
     const int pitch_dst = width + random.Int(0, 9);
-    // The last row ends with the picture, not with the pitch.
+    // The last row ends with the image, not with the pitch.
     const auto bytes = [&](int pitch) { return static_cast<size_t>(pitch * (height - 1) + width); };
     GuardedArray<uint8_t> a(random.Integers<uint8_t>(bytes(pitch_a)));
     GuardedArray<uint8_t> b(random.Integers<uint8_t>(bytes(pitch_b)));
@@ -149,9 +149,9 @@ TEST(YuyvSplit, NullAndEmpty) {
 }
 
 // A record with planes of its own.
-class Picture {
+class Image {
  public:
-  explicit Picture(const std::array<std::vector<uint8_t>, 3>& pixels, int64_t width) {
+  explicit Image(const std::array<std::vector<uint8_t>, 3>& pixels, int64_t width) {
     for (size_t i = 0; i < 3; ++i) {
       pixels_[i] = std::make_unique<GuardedArray<uint8_t>>(pixels[i]);
       planes_[i] = {width, static_cast<int64_t>(pixels[i].size()) / width, pixels_[i]->data()};
@@ -172,14 +172,14 @@ class DetectMotion : public ::testing::Test {
   int32_t Run() {
     return mcvDetectMotion(previous_.record(), current_.record(), next_.record(), mask_.record());
   }
-  static Picture Zeros() {
+  static Image Zeros() {
     const std::vector<uint8_t> plane(4, 0);
-    return Picture({plane, plane, plane}, 2);
+    return Image({plane, plane, plane}, 2);
   }
-  Picture previous_ = Zeros();
-  Picture current_ = Zeros();
-  Picture next_ = Zeros();
-  Picture mask_ = Zeros();
+  Image previous_ = Zeros();
+  Image current_ = Zeros();
+  Image next_ = Zeros();
+  Image mask_ = Zeros();
 };
 
 TEST_F(DetectMotion, MarksPixelsThatDifferFromBothNeighbours) {
@@ -196,7 +196,7 @@ TEST_F(DetectMotion, MarksPixelsThatDifferFromBothNeighbours) {
   EXPECT_EQ(mask_.plane(2).pixels[3], 255);
 }
 
-TEST_F(DetectMotion, RandomPicturesWithPlanesOfDifferentSizes) {
+TEST_F(DetectMotion, RandomImagesWithPlanesOfDifferentSizes) {
   Random random = TestRandom();
   for (int trial = 0; trial < 40; ++trial) {
     const int64_t width = random.Int(1, 40);
@@ -208,12 +208,12 @@ TEST_F(DetectMotion, RandomPicturesWithPlanesOfDifferentSizes) {
         pixels[i].resize(static_cast<size_t>(width * heights[i]));
         for (uint8_t& pixel : pixels[i]) pixel = static_cast<uint8_t>(random.Int(100, 140));
       }
-      return Picture(pixels, width);
+      return Image(pixels, width);
     };
-    Picture previous = planes(3, 2, 5);
-    Picture current = planes(3, 2, 5);
-    Picture next = planes(3, 2, 5);
-    Picture mask = planes(3, 2, 5);
+    Image previous = planes(3, 2, 5);
+    Image current = planes(3, 2, 5);
+    Image next = planes(3, 2, 5);
+    Image mask = planes(3, 2, 5);
     ASSERT_EQ(mcvDetectMotion(previous.record(), current.record(), next.record(), mask.record()),
               0);
     for (size_t i = 0; i < 3; ++i) {
@@ -230,47 +230,47 @@ TEST_F(DetectMotion, RandomPicturesWithPlanesOfDifferentSizes) {
 TEST_F(DetectMotion, NullRecordPlaneOrPixels) {
   ExpectEachNullRefused(-1, mcvDetectMotion, previous_.record(), current_.record(), next_.record(),
                         mask_.record());
-  for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
+  for (Image* image : {&previous_, &current_, &next_, &mask_}) {
     for (size_t i = 0; i < 3; ++i) {
-      picture->record()->plane[i] = nullptr;
+      image->record()->plane[i] = nullptr;
       EXPECT_EQ(Run(), -1);
-      picture->record()->plane[i] = &picture->plane(i);
-      uint8_t* pixels = picture->plane(i).pixels;
-      picture->plane(i).pixels = nullptr;
-      picture->plane(i).width = 5;  // the null counts before the size
+      image->record()->plane[i] = &image->plane(i);
+      uint8_t* pixels = image->plane(i).pixels;
+      image->plane(i).pixels = nullptr;
+      image->plane(i).width = 5;  // the null counts before the size
       EXPECT_EQ(Run(), -1);
-      picture->plane(i).pixels = pixels;
-      picture->plane(i).width = 2;
+      image->plane(i).pixels = pixels;
+      image->plane(i).width = 2;
     }
   }
   EXPECT_EQ(Run(), 0);
 }
 
 TEST_F(DetectMotion, SizesThatDifferOrAreEmpty) {
-  for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
+  for (Image* image : {&previous_, &current_, &next_, &mask_}) {
     for (size_t i = 0; i < 3; ++i) {
-      picture->plane(i).width = 1;
+      image->plane(i).width = 1;
       EXPECT_EQ(Run(), -2);
-      picture->plane(i).width = 2;
-      picture->plane(i).height = 1;
+      image->plane(i).width = 2;
+      image->plane(i).height = 1;
       EXPECT_EQ(Run(), -2);
-      picture->plane(i).height = 2;
+      image->plane(i).height = 2;
     }
   }
   for (const int64_t size : {int64_t{0}, int64_t{-2}}) {
-    for (Picture* picture : {&previous_, &current_, &next_, &mask_}) picture->plane(1).width = size;
+    for (Image* image : {&previous_, &current_, &next_, &mask_}) image->plane(1).width = size;
     EXPECT_EQ(Run(), -2);
-    for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
-      picture->plane(1).width = 2;
-      picture->plane(1).height = size;
+    for (Image* image : {&previous_, &current_, &next_, &mask_}) {
+      image->plane(1).width = 2;
+      image->plane(1).height = size;
     }
     EXPECT_EQ(Run(), -2);
   }
 }
 
 TEST_F(DetectMotion, SizesWhoseProductOverflowsAreRefused) {
-  for (Picture* picture : {&previous_, &current_, &next_, &mask_}) {
-    picture->plane(2).width = picture->plane(2).height = int64_t{1} << 40;
+  for (Image* image : {&previous_, &current_, &next_, &mask_}) {
+    image->plane(2).width = image->plane(2).height = int64_t{1} << 40;
   }
   EXPECT_EQ(Run(), -2);
 }

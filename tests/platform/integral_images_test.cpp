@@ -172,7 +172,7 @@ TEST(IntegralImage, PitchBelowWidthIsRefused) {
   EXPECT_EQ(sum16[1], 3u);
 }
 
-TEST(IntegralImage, EmptyPicturesHaveTheirZerosOnly) {
+TEST(IntegralImage, EmptyImagesHaveTheirZerosOnly) {
   const uint8_t src = 1;
   uint64_t sum[4] = {7, 7, 7, 7};
   ASSERT_EQ(mcvImgIntegralu8(&src, 2, 0, sum, nullptr), 0);

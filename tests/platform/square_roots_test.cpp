@@ -52,7 +52,7 @@ TEST(InverseSquareRoot, IsTheEstimateAndTwoNewtonSteps) {
   EXPECT_FLOAT_EQ(mcvInvSqrtf32(4.0f), 0.4999978f);
   Random random = TestRandom();
   for (size_t n = 0; n < 60; ++n) {
-    // Negative values, infinities and not-a-numbers too: whatever the steps make of them.
+    // Negative values, infinities and NaN too: whatever the steps make of them.
     GuardedArray<float> src(random.AwkwardFloats(n));
     GuardedArray<float> dst(n);
     std::vector<float> expected(n);

@@ -154,7 +154,7 @@ inline std::vector<Vec3> LandmarkPoints(const std::vector<double>& shape, int co
   return points;
 }
 
-// Pinhole projection as the engine sees a picture of width x height, before rounding.
+// Pinhole projection as the engine sees an image of width x height, before rounding.
 inline void Project(const RigidTransform& pose, const Vec3& p, int width, int height, double* u,
                     double* v) {
   const double f = (width + height) / 2.0;

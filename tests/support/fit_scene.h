@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// A made-up face model and pictures of its shapes, for the tests of the coefficient fits.
+// A made-up face model and images of its shapes, for the tests of the coefficient fits.
 #pragma once
 
 #include <cstdint>
@@ -61,7 +61,7 @@ struct FitModel {
   }
 };
 
-// The pose of a picture, and where its landmarks are.
+// The pose of an image, and where its landmarks are.
 struct FitView {
   std::vector<float> camera = {960, 0, 640, 0, 950, 360, 0, 0, 1};
   std::vector<float> rotation, translation = {5, -8, 600};

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// A head of 95 points and pictures of it under known poses, for tests and benchmarks of the solver.
+// A head of 95 points and images of it under known poses, for tests and benchmarks of the solver.
 #pragma once
 
 #include <array>
@@ -44,7 +44,7 @@ inline std::vector<float> MakeHead() {
   return points;
 }
 
-// The camera the tracker gives a picture of this size.
+// The camera the tracker gives an image of this size.
 inline std::array<float, 9> MakeCamera(int width, int height) {
   const float focal = static_cast<float>(width + height) / 2;
   return {focal, 0, static_cast<float>(width) / 2, 0, focal, static_cast<float>(height) / 2, 0,

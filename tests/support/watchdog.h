@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Ends a test that waits for ever, long before ctest would.
+// Ends a test that never returns, long before ctest would.
 #pragma once
 
 #include <unistd.h>

@@ -84,7 +84,7 @@ class ToolTest : public ::testing::Test {
   }
 
   // Sends a signal to a run as soon as something lies in `folder`. A child that has ended is
-  // noticed, so that the test does not wait for ever.
+  // noticed, so that the test does not wait indefinitely.
   Outcome EndBySignal(pid_t child, int signal, const std::string& folder) {
     std::error_code error;
     while (std::filesystem::is_empty(folder, error) || error) {

@@ -60,7 +60,7 @@ def further_points(landmarks):
 
 
 def profile(all_points):
-    """The middle line from the hairline to the neck, as points (z, y)."""
+    """The midline from the hairline to the neck, as points (z, y)."""
     middle = all_points[np.abs(all_points[:, 0]) < 0.01]
     order = np.argsort(-middle[:, 1], kind="stable")
     return middle[order][:, [2, 1]]

@@ -13,7 +13,7 @@ ROW = 2.0  # mm between the rows in which an outline is read
 REACH = 3.0  # mm, how near a candidate has to be
 TEMPLES = 22.0  # mm above the tragions: the ends of the outline
 TOP = 32.0  # nodding heads bring skin above the temples to the outline's ends
-BESIDE = (13.0, 40.0)  # mm from the middle line: the hollows beside nose and mouth, round the eyes
+BESIDE = (13.0, 40.0)  # mm from the midline: the hollows beside nose and mouth, round the eyes
 BESIDE_LOW = -40.0
 FOREHEAD = 45.0  # height above which nothing of the outline comes near
 EAR = 11.0  # depth at which outlines end before the ear
@@ -73,7 +73,7 @@ def choose(points: np.ndarray, mirror: np.ndarray, must: list[int], never: list[
 
     Candidates between the rows of the outline landmarks would let the landmarks slide along the
     outline, so what the table has to spare lies as far from the outlines as the face allows.
-    `never` are out. Vertices on the middle line come in twos, so that the number stays even.
+    `never` are out. Vertices on the midline come in twos, so that the number stays even.
     """
     chosen = set(must) | {int(mirror[v]) for v in must}
     barred = set(never) | {int(mirror[v]) for v in never}

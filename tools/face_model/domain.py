@@ -17,7 +17,7 @@ import sample_mesh
 from arithmetic import length, settled
 from measurements import Measurements
 
-# The rectangle of the texture that the face fills, and its middle line. Fixed: part of the file
+# The rectangle of the texture that the face fills, and its midline. Fixed: part of the file
 # format, for masks are painted in this layout.
 U_MIDDLE = 0.499946
 U_LEFT = 0.016646
@@ -78,7 +78,7 @@ class Domain:
     ids: np.ndarray  # measured points of the half
     flat: np.ndarray  # their flat places
     triangles: np.ndarray  # coarse triangles over them
-    border: np.ndarray  # dense polyline, from the top of the middle line to its bottom
+    border: np.ndarray  # dense polyline, from the top of the midline to its bottom
     eye: np.ndarray  # dense closed polyline through the lid rims
     mouth: np.ndarray  # dense polyline from the middle of the upper rim to that of the lower
     nostril: np.ndarray  # places round the rim of the nostril
@@ -141,7 +141,7 @@ def _catmull_rom(points, closed):
 
 
 def _border(flat):
-    """A smooth outline round the measured points, in polar form about the middle line."""
+    """A smooth outline round the measured points, in polar form about the midline."""
     both = np.concatenate([flat, flat * [-1, 1]])
     outer = ConvexHull(both).vertices
     outer = np.sort(outer[outer < len(flat)])

@@ -19,7 +19,7 @@ class Measurements:
     normals: np.ndarray  # (n, 3), unit, outward
     region: np.ndarray  # (n,) names
     landmark: np.ndarray  # (n,) landmark index or -1
-    mirror: np.ndarray  # (n,) id of the mirrored point, its own on the middle line
+    mirror: np.ndarray  # (n,) id of the mirrored point, its own on the midline
     identity: np.ndarray  # (16, n, 3) for one standard deviation
     expression: np.ndarray  # (20, n, 3) at full intensity
     expression_names: list[str]

@@ -18,7 +18,7 @@ from surface import Surface
 from triangulate import with_edges
 
 VERTICES, TRIANGLES, BOUNDARY_EDGES = 1812, 3456, 172
-MIDDLE_VERTICES = 72  # on the middle line; even, like the number of vertices
+MIDDLE_VERTICES = 72  # on the midline; even, like the number of vertices
 SEED = 1812
 
 # Wanted edge length (mm): (name of the feature, at the feature, growth a millimetre of distance)
@@ -43,7 +43,7 @@ class HalfMesh:
 
     flat: np.ndarray
     triangles: np.ndarray
-    middle: np.ndarray  # vertices on the middle line
+    middle: np.ndarray  # vertices on the midline
     fixed: np.ndarray  # vertices that keep their place
     named: dict[int, int]  # measured point -> vertex
     patch: dict[int, int]  # 0..4 -> vertex
@@ -66,7 +66,7 @@ def _spaced(line, count, weight=None):
 
 
 def _border_places(dom):
-    """Places along the border, from the top of the middle line to its bottom, and their rows.
+    """Places along the border, from the top of the midline to its bottom, and their rows.
 
     Before the ear, where outlines of turned heads run on the border, they lie where the rows for
     outlines meet it; above and below them the edges are even.
@@ -133,7 +133,7 @@ class _Frame:
     lid_middle: int = -1  # the vertex above the pupil on the upper lid's rim
     mouth: list[int] = field(default_factory=list)  # along the rims of the lips
     outer: list[int] = field(default_factory=list)  # along the border, top to bottom
-    middle: list[int] = field(default_factory=list)  # along the middle line
+    middle: list[int] = field(default_factory=list)  # along the midline
 
     def add(self, place, point=None):
         """A vertex at a flat place; with `point`, the one of that measured point."""
@@ -205,7 +205,7 @@ def _frame(dom, sizing):
 
 
 def _middle_counts(spans, sizing):
-    """Edges between neighbouring stops so that the middle line has its number of vertices."""
+    """Edges between neighbouring stops so that the midline has its number of vertices."""
     want = []
     for marks in spans:
         for a, b in zip(marks, marks[1:]):
@@ -213,7 +213,7 @@ def _middle_counts(spans, sizing):
             step = length(b - a) / 199
             want.append((step / sizing(dense)).sum())
     want = np.array(want)
-    total = MIDDLE_VERTICES - len(spans)  # edges on the middle line
+    total = MIDDLE_VERTICES - len(spans)  # edges on the midline
     counts = np.maximum(1, np.floor(want * total / want.sum())).astype(int)
     while counts.sum() < total:
         counts[np.argmax(want * total / want.sum() / counts)] += 1
@@ -250,7 +250,7 @@ def half_mesh(dom: Domain) -> HalfMesh:
     fixed = np.array(frame.places)
     fixed[frame.middle, 0] = 0.0
 
-    # the mouth is open towards the middle line: close its outline beyond it
+    # the mouth is open towards the midline: close its outline beyond it
     mouth = fixed[frame.mouth]
     lips = np.concatenate([mouth, [[1.0, mouth[-1, 1]], [1.0, mouth[0, 1]]]])
     holes = [fixed[:LID_RING], lips, fixed[quad]]

@@ -91,7 +91,7 @@ def with_edges(plane: np.ndarray, edges: list[tuple[int, int]]) -> np.ndarray:
                 flipped = True
                 break
             if not flipped:
-                raise ValueError(f"edge {goal} cannot be had")
+                raise ValueError(f"edge {goal} cannot be made")
     return np.array(triangles)
 
 

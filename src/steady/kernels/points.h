@@ -47,11 +47,11 @@ inline void SumShape(const StateMean& state, const float* mean, const float (*id
   }
 }
 
-// How far out each place of the outline's rows lies in the picture, mm at the face's depth.
+// How far out each place of the outline's rows lies in the image, mm at the face's depth.
 inline void OutwardPlaces(const Model& model, const Face& face, const Workspace& work,
                           float* outward) {
   const float* r = face.mean.rotation.m;
-  // The upright head's axis in the picture: outward directions turn with the roll alone.
+  // The upright head's axis in the image: outward directions turn with the roll alone.
   const float axis_u = r[1] * kTiltCosine - r[2] * kTiltSine;
   const float axis_v = r[4] * kTiltCosine - r[5] * kTiltSine;
   const float length = std::sqrt(axis_u * axis_u + axis_v * axis_v) + 1e-12f;

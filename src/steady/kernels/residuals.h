@@ -13,7 +13,7 @@
 
 namespace n3ds::steady::N3DS_KERNEL_SET {
 
-// Camera depths below this, mm, are none: a point there has no place in the picture.
+// Camera depths below this, mm, are none: a point there has no place in the image.
 constexpr float kLeastDepth = 1.0f;
 
 inline void ProjectLandmarks(const Model& model, const Observation& seen, const Face& face,
@@ -48,7 +48,7 @@ inline void ProjectLandmarks(const Model& model, const Observation& seen, const 
   }
 }
 
-// The offsets' uncertainty as it is seen in the picture, to the landmarks' own measurements.
+// The offsets' uncertainty as it is seen in the image, to the landmarks' own measurements.
 inline void ProjectOffsetNoise(const Face& face, Workspace* work) {
   for (int i = 0; i < kLandmarkStride; i += kLanes) {
     const F32x8 xx = Load(&face.offset_covariance[0][i]);

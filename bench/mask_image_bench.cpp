@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// A mask picture drawn onto a tracked face and blended into a camera picture of 1280 x 720, beside
+// A mask image drawn onto a tracked face and blended into a camera image of 1280 x 720, beside
 // OpenCV on one thread. Each bench compares its result with the engine's: the counter `off` is the
 // share of pixels that differ by more than kAllowedLevels in some channel, of those drawn on.
 #include <benchmark/benchmark.h>
@@ -26,13 +26,13 @@ constexpr double kAllowedBlend = 0.0;
 
 constexpr int kTextureSize = 512;
 
-NSVL_OFFSCREEN Describe(cv::Mat& picture, uint32_t format) {
+NSVL_OFFSCREEN Describe(cv::Mat& image, uint32_t format) {
   NSVL_OFFSCREEN described = {};
   described.pixelFormat = format;
-  described.width = picture.cols;
-  described.height = picture.rows;
-  described.plane[0] = picture.data;
-  described.pitch[0] = static_cast<int32_t>(picture.step);
+  described.width = image.cols;
+  described.height = image.rows;
+  described.plane[0] = image.data;
+  described.pitch[0] = static_cast<int32_t>(image.step);
   return described;
 }
 
@@ -52,7 +52,7 @@ cv::Mat MakeTexture() {
   return texture;
 }
 
-// A tracked face in a camera picture, the mask's texture, and the mask drawn by the engine.
+// A tracked face in a camera image, the mask's texture, and the mask drawn by the engine.
 struct Scene {
   TrackedFaces faces{1};
   cv::Mat texture = MakeTexture();
@@ -109,7 +109,7 @@ struct Scene {
       TrianglePair t;
       for (int c = 0; c < 3; ++c) {
         const float* uv = kTextureCoordinates[corners[c]];
-        t.picture[c] = Project(corners[c]);
+        t.image[c] = Project(corners[c]);
         t.texture[c] = {std::min(uv[0] * kTextureSize, kTextureSize - 3.0f),
                         std::min(uv[1] * kTextureSize, kTextureSize - 3.0f)};
       }
@@ -129,7 +129,7 @@ int LargestDifference(const uint8_t* a, const uint8_t* b, int channels) {
   return largest;
 }
 
-// Compares two pictures where `drawn` or the first is not transparent, or everywhere in `where`.
+// Compares two images where `drawn` or the first is not transparent, or everywhere in `where`.
 void ExpectAlike(const cv::Mat& engine, const cv::Mat& peer, const cv::Rect& where, double allowed,
                  benchmark::State& state) {
   int compared = 0, off = 0;
@@ -146,25 +146,25 @@ void ExpectAlike(const cv::Mat& engine, const cv::Mat& peer, const cv::Rect& whe
   const double share = static_cast<double>(off) / compared;
   state.counters["pixels"] = compared;
   state.counters["off"] = std::max(share, state.counters["off"].value);
-  if (compared < 1000 || !(share <= allowed)) state.SkipWithError("the pictures differ");
+  if (compared < 1000 || !(share <= allowed)) state.SkipWithError("the images differ");
 }
 
 void WarpEngine(benchmark::State& state) {
   Scene& s = SharedScene();
-  cv::Mat picture(s.drawn.size(), CV_8UC4);
-  NSVL_OFFSCREEN output = Describe(picture, N3DS_FORMAT_BGRA32);
+  cv::Mat image(s.drawn.size(), CV_8UC4);
+  NSVL_OFFSCREEN output = Describe(image, N3DS_FORMAT_BGRA32);
   for (auto _ : state) {
     if (s.Warp(&output) != N3DS_OK) state.SkipWithError("no warp");
   }
-  ExpectAlike(s.drawn, picture, cv::Rect(cv::Point(), picture.size()), 0, state);
+  ExpectAlike(s.drawn, image, cv::Rect(cv::Point(), image.size()), 0, state);
 }
 
 template <typename Warp>
 void WarpPeer(benchmark::State& state, Warp warp) {
   const Scene& s = SharedScene();
-  cv::Mat picture(s.drawn.size(), CV_8UC4);
-  for (auto _ : state) warp(s, &picture);
-  ExpectAlike(s.drawn, picture, cv::Rect(cv::Point(), picture.size()), kAllowedOutline, state);
+  cv::Mat image(s.drawn.size(), CV_8UC4);
+  for (auto _ : state) warp(s, &image);
+  ExpectAlike(s.drawn, image, cv::Rect(cv::Point(), image.size()), kAllowedOutline, state);
 }
 void WarpOpencvPiecewise(benchmark::State& state) {
   WarpPeer(state, [](const Scene& s, cv::Mat* p) { WarpPiecewise(s.texture, s.triangles, p); });
@@ -183,25 +183,25 @@ cv::Mat BlendBgr24ByEngine(Scene& s, cv::Mat* output) {
 
 void BlendBgr24Engine(benchmark::State& state) {
   Scene& s = SharedScene();
-  cv::Mat picture(s.bgr.size(), CV_8UC3), peer(s.bgr.size(), CV_8UC3);
-  for (auto _ : state) BlendBgr24ByEngine(s, &picture);
+  cv::Mat image(s.bgr.size(), CV_8UC3), peer(s.bgr.size(), CV_8UC3);
+  for (auto _ : state) BlendBgr24ByEngine(s, &image);
   BlendBgr24(s.bgr, s.drawn, s.where, &peer);
-  ExpectAlike(picture, peer, cv::Rect(cv::Point(), peer.size()), kAllowedBlend, state);
+  ExpectAlike(image, peer, cv::Rect(cv::Point(), peer.size()), kAllowedBlend, state);
 }
 
 void BlendBgr24Opencv(benchmark::State& state) {
   Scene& s = SharedScene();
-  cv::Mat picture(s.bgr.size(), CV_8UC3), peer(s.bgr.size(), CV_8UC3);
+  cv::Mat image(s.bgr.size(), CV_8UC3), peer(s.bgr.size(), CV_8UC3);
   for (auto _ : state) BlendBgr24(s.bgr, s.drawn, s.where, &peer);
-  BlendBgr24ByEngine(s, &picture);
-  ExpectAlike(picture, peer, cv::Rect(cv::Point(), peer.size()), kAllowedBlend, state);
+  BlendBgr24ByEngine(s, &image);
+  ExpectAlike(image, peer, cv::Rect(cv::Point(), peer.size()), kAllowedBlend, state);
 }
 
-struct Nv21Picture {
+struct Nv21Image {
   cv::Mat luma, chroma;
 };
 
-void BlendNv21ByEngine(Scene& s, Nv21Picture* output) {
+void BlendNv21ByEngine(Scene& s, Nv21Image* output) {
   NSVL_OFFSCREEN image = Describe(s.luma, N3DS_FORMAT_NV21);
   image.plane[1] = s.chroma.data;
   image.pitch[1] = static_cast<int32_t>(s.chroma.step);
@@ -211,7 +211,7 @@ void BlendNv21ByEngine(Scene& s, Nv21Picture* output) {
   out.pitch[1] = static_cast<int32_t>(output->chroma.step);
   N3DS_BlendFaceMask(nullptr, &image, &mask, &out);
 }
-void BlendNv21ByOpencv(const Scene& s, Nv21Picture* output) {
+void BlendNv21ByOpencv(const Scene& s, Nv21Image* output) {
   BlendNv21(s.luma, s.chroma, s.drawn, s.where, &output->luma, &output->chroma);
 }
 
@@ -219,7 +219,7 @@ void BlendNv21ByOpencv(const Scene& s, Nv21Picture* output) {
 template <typename Blend>
 void RunNv21(benchmark::State& state, Blend blend) {
   Scene& s = SharedScene();
-  Nv21Picture engine{s.luma.clone(), s.chroma.clone()}, peer{s.luma.clone(), s.chroma.clone()};
+  Nv21Image engine{s.luma.clone(), s.chroma.clone()}, peer{s.luma.clone(), s.chroma.clone()};
   for (auto _ : state) blend(s, &engine, &peer);
   BlendNv21ByEngine(s, &engine);
   BlendNv21ByOpencv(s, &peer);
@@ -228,10 +228,10 @@ void RunNv21(benchmark::State& state, Blend blend) {
   ExpectAlike(engine.chroma, peer.chroma, half, kAllowedBlend, state);
 }
 void BlendNv21Engine(benchmark::State& state) {
-  RunNv21(state, [](Scene& s, Nv21Picture* e, Nv21Picture*) { BlendNv21ByEngine(s, e); });
+  RunNv21(state, [](Scene& s, Nv21Image* e, Nv21Image*) { BlendNv21ByEngine(s, e); });
 }
 void BlendNv21Opencv(benchmark::State& state) {
-  RunNv21(state, [](Scene& s, Nv21Picture*, Nv21Picture* p) { BlendNv21ByOpencv(s, p); });
+  RunNv21(state, [](Scene& s, Nv21Image*, Nv21Image* p) { BlendNv21ByOpencv(s, p); });
 }
 
 BENCHMARK(WarpEngine)->Unit(benchmark::kMicrosecond);

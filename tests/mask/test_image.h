@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-// Pictures for the tests of the image functions. Every plane is a block of its own of exactly the
+// Images for the tests of the image functions. Every plane is a block of its own of exactly the
 // promised size, so that a sanitizer sees one byte too many.
 #pragma once
 
@@ -14,10 +14,10 @@
 
 namespace n3ds::testing {
 
-class TestPicture {
+class TestImage {
  public:
   // Rows are `padding` bytes longer than their pixels; the last row has its padding too.
-  TestPicture(uint32_t format, int width, int height, int padding = 0) {
+  TestImage(uint32_t format, int width, int height, int padding = 0) {
     descriptor_.pixelFormat = format;
     descriptor_.width = width;
     descriptor_.height = height;
@@ -28,7 +28,7 @@ class TestPicture {
   }
 
   // The same descriptor and a copy of the bytes.
-  TestPicture(const TestPicture& other) : descriptor_(other.descriptor_) {
+  TestImage(const TestImage& other) : descriptor_(other.descriptor_) {
     for (int p = 0; p < 2; ++p) {
       sizes_[p] = other.sizes_[p];
       if (other.planes_[p] == nullptr) continue;
@@ -37,7 +37,7 @@ class TestPicture {
       descriptor_.plane[p] = planes_[p].get();
     }
   }
-  TestPicture& operator=(const TestPicture&) = delete;
+  TestImage& operator=(const TestImage&) = delete;
 
   NSVL_OFFSCREEN* get() { return &descriptor_; }
   const NSVL_OFFSCREEN& descriptor() const { return descriptor_; }
