@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
 // Where outline landmarks may lie: a row of places on the skin for each, from the jaw's or the
-// temple's back edge towards the cheek. Made by tools/make_outline_rows.py.
+// temple's back edge towards the cheek. Made by tools/face_model/outline_rows.py.
 #pragma once
 
 #include "steady/layout.h"

@@ -29,7 +29,7 @@ MAKERS = {
               "data", MODEL),
     "assets": ([("assets/make_sticker_assets.py", "--out"),
                 ("assets/make_mask_textures.py", "--out")], "examples/assets", ASSETS),
-    "outline": ([("make_outline_rows.py", "--out")], "data",
+    "outline": ([("face_model/outline_rows.py", "--out")], "data",
                 ["outline_rows.inc", "outline_normals.inc"]),
 }
 

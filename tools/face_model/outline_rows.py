@@ -1,20 +1,21 @@
-#!/usr/bin/python3
+#!/usr/bin/env python3
 # SPDX-License-Identifier: MIT
 """Makes data/outline_rows.inc and data/outline_normals.inc: where outline landmarks may lie.
 
-A detector's outline landmark lies where the face ends in the picture. On the head it slides along a
+A detector's outline landmark lies where the face ends in the image. On the head it slides along a
 line across the cheek as the head turns, each landmark along a line of its own, roughly level, round
 the chin towards its middle. Every line is cut into 17 places at equal distances on the skin of the
 mean face, from the ear or the jaw's edge towards the cheek; a place is three vertices of a triangle
 and their shares.
 """
+
 import argparse
 import pathlib
 import re
 
 import numpy as np
 
-ROOT = pathlib.Path(__file__).resolve().parent.parent
+ROOT = pathlib.Path(__file__).resolve().parents[2]
 PLACES = 17
 VERTICES = 1812
 OUTLINE = 19
@@ -23,8 +24,9 @@ CHIN = 9
 # The mean face is pitched against an upright head by 20 degrees; lines are laid out upright.
 COSINE, SINE = 0.9397, 0.342
 
-# Ends of the lines, mm on the upright head, x to the image right, y up, z out of the face: behind the
-# landmark's own vertex and in front of it. Landmarks 0 to 7, image left; the right side mirrors them.
+# Ends of the lines, mm on the upright head, x to the image right, y up, z out of the face: behind
+# the landmark's own vertex and in front of it. Landmarks 0 to 7, image left; the right side mirrors
+# them.
 ENDS = {
     0: ((-76.5, 21, 15), (-54, 20, 70)),
     1: ((-75, 3.5, 15), (-46, 3, 78)),
@@ -41,7 +43,7 @@ RADIAL_CENTRE = np.array([0.0, -22.0, 48.0])
 
 
 def numbers(path):
-    """All whole numbers of an .inc file without its comments."""
+    """All integers of an .inc file without its comments."""
     text = re.sub(r"//.*", "", path.read_text())
     return np.array([int(word) for word in re.findall(r"-?\d+", text)])
 
@@ -106,7 +108,8 @@ def row_of(landmark, surface, vertex):
     places = [surface.nearest(p) for p in line]
     on_skin = np.array([shares @ surface.points[triangle] for triangle, shares in places])
     along = np.concatenate([[0], np.cumsum(np.linalg.norm(np.diff(on_skin, axis=0), axis=1))])
-    chosen = [int(np.argmin(np.round(abs(along - s), 6))) for s in np.linspace(0, along[-1], PLACES)]
+    chosen = [int(np.argmin(np.round(abs(along - s), 6)))
+              for s in np.linspace(0, along[-1], PLACES)]
     out = np.array([-1.0, 0.0])
     if point[1] <= RADIAL_CENTRE[1]:
         out = point[:2] - RADIAL_CENTRE[:2]
@@ -116,7 +119,7 @@ def row_of(landmark, surface, vertex):
 
 def write(path, what, lines):
     path.write_text("// SPDX-License-Identifier: MIT\n// " + what +
-                    "\n// Made by tools/make_outline_rows.py.\n" + "".join(lines))
+                    "\n// Made by tools/face_model/outline_rows.py.\n" + "".join(lines))
 
 
 def main():
@@ -130,7 +133,8 @@ def main():
     triangles = numbers(arguments.data / "triangles.inc").reshape(-1, 3)
     vertices = numbers(arguments.data / "default_contour_vertex_indices.inc")
     surface = Surface(points, triangles)
-    mirrored = [int(np.argmin(np.round(((points * [-1, 1, 1] - p) ** 2).sum(1), 6))) for p in points]
+    mirrored = [int(np.argmin(np.round(((points * [-1, 1, 1] - p) ** 2).sum(1), 6)))
+                for p in points]
 
     rows, normals = [], []
     for landmark in range(CHIN + 1):
