@@ -3,9 +3,9 @@
 # The shared library is protected against overruns and against being rewired by its host: checks of
 # the stack, of copies and of indirect branches, relocations that are final before the first call,
 # and no call of its own functions that another library's function of the same name could take over.
-#   hardened_library_test.sh LIBRARY BUILD_TYPE NM READELF OBJDUMP
+#   hardened_library_test.sh LIBRARY BUILD_TYPE COMPILER NM READELF OBJDUMP
 set -euo pipefail
-library=$1 build_type=$2 nm=$3 readelf=$4 objdump=$5
+library=$1 build_type=$2 compiler=$3 nm=$4 readelf=$5 objdump=$6
 status=0
 complain() { printf '%s\n' "$1"; status=1; }
 has() { grep -q -- "$1" <<<"$2"; }
@@ -17,7 +17,8 @@ undefined=$("$nm" -D --undefined-only "$library" | awk '{print $2}')
 has 'GNU_RELRO' "$segments" || complain "no read-only relocations"
 has 'NOW' "$dynamic" || complain "symbols are bound lazily: the relocation table stays writable"
 has '__stack_chk_fail' "$undefined" || complain "no stack protector"
-if [ "$build_type" != Debug ]; then
+# Clang writes the library's few lines without any function that has a checked form.
+if [ "$build_type" != Debug ] && [ "$compiler" = GNU ]; then
   has '_chk\b' "$(grep -v __stack_chk_fail <<<"$undefined")" || complain "no checked string functions"
 fi
 
