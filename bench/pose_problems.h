@@ -53,7 +53,7 @@ struct ProblemSet {
   }
   PoseProblem For(const Problem& p) const {
     return {p.landmarks.data(), model.data(), testing::kHeadPoints, camera.data(), 1, 1, 0, 1,
-            kPoseParameters};
+            kPoseSize};
   }
 };
 

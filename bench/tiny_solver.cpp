@@ -22,13 +22,13 @@ int Solve(const Function& function, float* pose) {
 
 struct EngineFunction {
   using Scalar = float;
-  enum { NUM_RESIDUALS = kTinyResiduals, NUM_PARAMETERS = kPoseParameters };
+  enum { NUM_RESIDUALS = kTinyResiduals, NUM_PARAMETERS = kPoseSize };
   PoseResiduals residuals;
 
   bool operator()(const float* pose, float* r, float* jacobian) const {
     if (jacobian == nullptr) return residuals.Evaluate(pose, r) == N3DS_OK;
     // The engine's transpose is the column-major matrix that is wanted.
-    float rows[kTinyResiduals * kPoseParameters];
+    float rows[kTinyResiduals * kPoseSize];
     return residuals.Linearise(pose, r, rows, jacobian) == N3DS_OK;
   }
 };
@@ -66,7 +66,7 @@ int SolveTinyOnEngineResiduals(const PoseProblem& problem, float* pose) {
 
 int SolveTinyOnReprojectionError(const PoseProblem& problem, float* pose) {
   using Function =
-      ceres::TinySolverAutoDiffFunction<ReprojectionError, kTinyResiduals, kPoseParameters, float>;
+      ceres::TinySolverAutoDiffFunction<ReprojectionError, kTinyResiduals, kPoseSize, float>;
   const ReprojectionError error{problem};
   return Solve(Function(error), pose);
 }

@@ -5,12 +5,12 @@
 #include <cstdint>
 
 #include "core/model_tables.h"
+#include "math/pose.h"
 #include "norvale_3d_sticker_core.h"
 
 namespace n3ds {
 
 constexpr int kSlotCount = N3DS_MAX_FACES;
-constexpr int kPoseSize = 7;  // qw, qx, qy, qz, tx, ty, tz
 
 // The core's handle points to one of these; N3DS_Init fills it with zeros. After a frame, slot k of
 // every per-slot array holds the track of the frame's face k.

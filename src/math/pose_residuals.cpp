@@ -62,14 +62,14 @@ static_assert(sizeof(kMayCountAcross) / sizeof(kMayCountAcross[0]) >= kOutlineEn
               sizeof(kMayCountAcross) / sizeof(kMayCountAcross[0]) % kBlock == 0);
 // g = J^T r, each entry summed in the order of the rows.
 void MultiplyTransposed(const float* J, const float* r, size_t rows, size_t columns, float* g) {
-  if (columns == kPoseParameters) {
+  if (columns == kPoseSize) {
     // Columns 0 to 3 and 3 to 6; both compute column 3 alike.
     F32x4 low = F32x4::Splat(0.0f), high = F32x4::Splat(0.0f);
     for (size_t row = 0; row < rows; ++row) {
       const F32x4 residual = F32x4::Splat(r[row]);
       low = low + F32x4::Load(J) * residual;
       high = high + F32x4::Load(J + 3) * residual;
-      J += kPoseParameters;
+      J += kPoseSize;
     }
     low.Store(g);
     high.Store(g + 3);
@@ -188,7 +188,7 @@ struct PoseResiduals::Points {
 
 // Derivatives of u and v by each parameter.
 struct PoseResiduals::Derivatives {
-  F32x4 u[kPoseParameters], v[kPoseParameters];
+  F32x4 u[kPoseSize], v[kPoseSize];
 };
 
 // A pose and camera, spread over the lanes.
@@ -265,7 +265,7 @@ inline PoseResiduals::Derivatives PoseResiduals::Differentiate(const View& view,
                    {twice_fy * (b * zc - yc * c) / zz, twice_fy * (yc_x * zc - yc * b) / zz,
                     twice_fy * (sum * zc - yc * zc_y) / zz, twice_fy * (a * zc - yc * sum) / zz,
                     zero, view.fy / zc, -p.fy_yc / zz}};
-  for (int k = 0; k < kPoseParameters; ++k) {
+  for (int k = 0; k < kPoseSize; ++k) {
     d.u[k] = d.u[k] * p.group_factor * p.speech_factor;
     d.v[k] = d.v[k] * p.group_factor * p.speech_factor;
   }
@@ -292,7 +292,7 @@ MRESULT PoseResiduals::EvaluatePoints(const float* pose, float* r, float* J, flo
     if constexpr (kDerivatives) {
       Derivatives d = Differentiate(view, p);
       if (any_across) {
-        for (int32_t k = 0; k < kPoseParameters; ++k) ProjectAcross(across, &d.u[k], &d.v[k]);
+        for (int32_t k = 0; k < kPoseSize; ++k) ProjectAcross(across, &d.u[k], &d.v[k]);
       }
       StoreDerivatives(d, first, count, J, Jt);
       WeightOtherColumns(p, any_across ? &across : nullptr, first, count, J, Jt);
@@ -326,12 +326,12 @@ inline void PoseResiduals::StorePairs(F32x4 u, F32x4 v, int32_t count, float* pa
 inline void PoseResiduals::StoreDerivatives(const Derivatives& d, int32_t first, int32_t count,
                                             float* J, float* Jt) const {
   const size_t columns = static_cast<size_t>(problem_.parameter_count);
-  if (columns != kPoseParameters) {
-    const size_t known = std::min<size_t>(columns, kPoseParameters);
+  if (columns != kPoseSize) {
+    const size_t known = std::min<size_t>(columns, kPoseSize);
     for (size_t k = 0; k < known; ++k) StoreColumn(d.u[k], d.v[k], k, first, count, J, Jt);
     return;
   }
-  constexpr size_t kRowPair = 2 * kPoseParameters;
+  constexpr size_t kRowPair = 2 * kPoseSize;
   float part[kBlock * kRowPair];
   float* const block = J + static_cast<size_t>(first) * kRowPair;
   float* row = count == kBlock ? block : part;
@@ -354,7 +354,7 @@ inline void PoseResiduals::StoreDerivatives(const Derivatives& d, int32_t first,
   if (Jt == nullptr) return;
   const size_t rows = 2 * static_cast<size_t>(problem_.point_count);
   float* column = Jt + 2 * static_cast<size_t>(first);
-  for (size_t k = 0; k < kPoseParameters; ++k) {
+  for (size_t k = 0; k < kPoseSize; ++k) {
     StorePairs(d.u[k], d.v[k], count, column);
     column += rows;
   }
@@ -364,7 +364,7 @@ void PoseResiduals::WeightOtherColumns(const Points& p, const Mask32x4* across, 
                                        int32_t count, float* J, float* Jt) const {
   const size_t columns = static_cast<size_t>(problem_.parameter_count);
   const float* row = J + 2 * static_cast<size_t>(first) * columns;
-  for (size_t k = kPoseParameters; k < columns; ++k) {
+  for (size_t k = kPoseSize; k < columns; ++k) {
     float u[kBlock] = {}, v[kBlock] = {};
     for (size_t l = 0; l < static_cast<size_t>(count); ++l) {
       u[l] = row[2 * l * columns + k];

@@ -6,14 +6,11 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "math/pose.h"
 #include "norvale_3d_sticker_core.h"
 #include "platform/simd.h"
 
 namespace n3ds {
-
-// A pose is a quaternion w, x, y, z, used at whatever length it has, and a translation. It is
-// always seven floats, also when fewer or more parameters are asked for.
-constexpr int32_t kPoseParameters = 7;
 
 // Beyond it the number of residuals, two per point, is no 32-bit integer.
 constexpr int32_t kMaxPoints = INT32_MAX / 2;

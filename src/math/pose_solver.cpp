@@ -102,7 +102,7 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
   const int32_t parameters = problem.parameter_count;
   const size_t rows = 2 * static_cast<size_t>(problem.point_count);
   const size_t n = static_cast<size_t>(parameters);
-  const size_t pose_size = std::max<size_t>(n, kPoseParameters);
+  const size_t pose_size = std::max<size_t>(n, kPoseSize);
 
   const ScratchArray<float> J(memory, rows * n);
   const ScratchArray<float> JtJ(memory, n * n);
@@ -116,7 +116,7 @@ MRESULT SolvePose(MHandle memory, const PoseProblem& problem, float* pose,
   const ScratchArray<float> trial(memory, pose_size);
   if (!A || !h || !trial) return N3DS_NO_MEMORY;
   // Parameters that the pose does not have get no derivative: their columns stay zero.
-  if (parameters > kPoseParameters) J.Zero();
+  if (parameters > kPoseSize) J.Zero();
 
   float* r = residuals_a.get();
   float* r_trial = residuals_b.get();
