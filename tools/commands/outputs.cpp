@@ -87,7 +87,9 @@ void CheckIsNoInput(const std::string& output, const std::vector<std::string>& i
     struct stat read = {};
     const char* path = input == "-" ? "/dev/stdin" : input.c_str();
     if (stat(path, &read) == 0 && read.st_dev == written.st_dev && read.st_ino == written.st_ino) {
-      throw UsageError(output + ": is also an input (" + input + ") and would be replaced");
+      std::string sentence = output;
+      sentence.append(": is also an input (").append(input).append(") and would be replaced");
+      throw UsageError(sentence);
     }
   }
 }

@@ -227,38 +227,50 @@ double EngineFocal(const TrackHeader& header) {
   return static_cast<double>(header.width + header.height) / 2;
 }
 
+namespace {
+
+// Normal equations of an origin.
+struct OriginEquations {
+  Matrix3 normal{};
+  Vector3 right{};
+
+  // What the camera sees at R c + t should lie on the true origin's viewing direction (u, v). Only
+  // directions count, so that heads taken for too near or too far do not pull the origin c along.
+  void Add(const Sample& sample, double focal_ratio) {
+    const Matrix3& r = sample.pose.rotation;
+    const Vector3& t = sample.pose.translation;
+    const Vector3& truth = sample.truth->translation;
+    for (std::size_t axis = 0; axis < 2; ++axis) {
+      const double direction = truth[axis] / truth[2] * focal_ratio;
+      Vector3 row;
+      for (std::size_t k = 0; k < 3; ++k) row[k] = r[3 * axis + k] - direction * r[6 + k];
+      const double rest = direction * t[2] - t[axis];
+      for (std::size_t a = 0; a < 3; ++a) {
+        for (std::size_t b = 0; b < 3; ++b) normal[3 * a + b] += row[a] * row[b];
+        right[a] += row[a] * rest;
+      }
+    }
+  }
+};
+
+}  // namespace
+
 HeadFrameOffset EstimateOffset(const std::vector<JudgedTrack>& tracks) {
   HeadFrameOffset offset;
   std::vector<Matrix3> rotations;
-  // Normal equations of the origin c: what the camera sees at R c + t should lie on the true
-  // origin's viewing direction (u, v). Only directions count, so that heads taken for too near or
-  // too far do not pull the origin along.
-  Matrix3 normal{};
-  Vector3 right{};
+  OriginEquations origin;
   for (const JudgedTrack& judged : tracks) {
     for (const auto& [id, samples] : ByPerson(judged)) {
       for (const Sample& sample : samples) {
         if (!sample.pose.valid) continue;
-        const Matrix3& r = sample.pose.rotation;
-        rotations.push_back(Multiplied(Transposed(sample.truth->rotation), r));
-        const Vector3& t = sample.pose.translation;
-        const Vector3& truth = sample.truth->translation;
-        for (std::size_t axis = 0; axis < 2; ++axis) {
-          const double direction = truth[axis] / truth[2] * FocalRatio(judged);
-          Vector3 row;
-          for (std::size_t k = 0; k < 3; ++k) row[k] = r[3 * axis + k] - direction * r[6 + k];
-          const double rest = direction * t[2] - t[axis];
-          for (std::size_t a = 0; a < 3; ++a) {
-            for (std::size_t b = 0; b < 3; ++b) normal[3 * a + b] += row[a] * row[b];
-            right[a] += row[a] * rest;
-          }
-        }
+        rotations.push_back(Multiplied(Transposed(sample.truth->rotation), sample.pose.rotation));
+        origin.Add(sample, FocalRatio(judged));
       }
     }
   }
   if (rotations.empty()) return offset;
   offset.rotation = MeanRotation(rotations);
-  offset.origin = SolveSymmetric(normal, right);
+  offset.origin = SolveSymmetric(origin.normal, origin.right);
   return offset;
 }
 

@@ -127,12 +127,14 @@ DescriptorBuffer::DescriptorBuffer(int descriptor) : descriptor_(descriptor), by
 DescriptorBuffer::~DescriptorBuffer() { Close(); }
 
 DescriptorBuffer::int_type DescriptorBuffer::overflow(int_type letter) {
-  if (sync() != 0) return traits_type::eof();
+  if (!Flush()) return traits_type::eof();
   if (traits_type::eq_int_type(letter, traits_type::eof())) return traits_type::not_eof(letter);
   return sputc(traits_type::to_char_type(letter));
 }
 
-int DescriptorBuffer::sync() {
+int DescriptorBuffer::sync() { return Flush() ? 0 : -1; }
+
+bool DescriptorBuffer::Flush() {
   const char* next = pbase();
   while (next != pptr() && error_ == 0) {
     const ssize_t written = write(descriptor_, next, static_cast<std::size_t>(pptr() - next));
@@ -143,12 +145,12 @@ int DescriptorBuffer::sync() {
     }
   }
   setp(bytes_.data(), bytes_.data() + bytes_.size());
-  return error_ == 0 ? 0 : -1;
+  return error_ == 0;
 }
 
 bool DescriptorBuffer::Close() {
   if (descriptor_ < 0) return error_ == 0;
-  sync();
+  Flush();
   if (close(descriptor_) != 0 && error_ == 0) error_ = errno;
   descriptor_ = -1;
   return error_ == 0;

@@ -54,6 +54,8 @@ class DescriptorBuffer : public std::streambuf {
   int sync() override;
 
  private:
+  bool Flush();  // false when not everything could be written
+
   int descriptor_;
   int error_ = 0;
   std::array<char, 65536> bytes_;
