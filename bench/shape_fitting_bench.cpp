@@ -51,10 +51,10 @@ struct Scene {
     const std::vector<double> shape = testing::ModelShape(
         std::vector<double>(identity, identity + kIdentityCount), {0.5, 0, 0.3, 0, 0, 0.4});
     landmarks = testing::DetectLandmarks(shape, place, 1280, 640);
-    for (int i = 0; i < kFitLandmarkCount; ++i) {
-      const testing::Vec3 p = testing::VertexOf(shape, vertices[static_cast<size_t>(i)]);
-      points.push_back(static_cast<float>(landmarks[static_cast<size_t>(2 * i)]));
-      points.push_back(static_cast<float>(landmarks[static_cast<size_t>(2 * i + 1)]));
+    for (size_t i = 0; i < kFitLandmarkCount; ++i) {
+      const testing::Vec3 p = testing::VertexOf(shape, vertices[i]);
+      points.push_back(static_cast<float>(landmarks[2 * i]));
+      points.push_back(static_cast<float>(landmarks[2 * i + 1]));
       points.push_back(
           static_cast<float>(pose.r[6] * p.x + pose.r[7] * p.y + pose.r[8] * p.z + pose.t[2]));
     }
