@@ -14,7 +14,7 @@ constexpr float kDepthNoise = 0.0004f;
 
 // --- Shape. Expressions return to a slight rest; blinks are too quick to be predicted.
 constexpr double kExpressionDecay = 0.10536;
-constexpr float kExpressionNoise = 0.03f;  // more trembles, less trails behind the mouth
+constexpr float kExpressionNoise = 0.03f;  // more jitters, less lags behind the mouth
 constexpr float kBlinkNoise = 0.25f;
 constexpr float kIdentityNoise = 0.002f;
 constexpr float kExpressionRest = 0.08f;    // people rarely look quite neutral

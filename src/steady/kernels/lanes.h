@@ -28,7 +28,7 @@ N3DS_LANE_INLINE F32x8 operator-(F32x8 a, F32x8 b) { return {_mm256_sub_ps(a.v, 
 N3DS_LANE_INLINE F32x8 operator*(F32x8 a, F32x8 b) { return {_mm256_mul_ps(a.v, b.v)}; }
 N3DS_LANE_INLINE F32x8 operator/(F32x8 a, F32x8 b) { return {_mm256_div_ps(a.v, b.v)}; }
 N3DS_LANE_INLINE F32x8 Root(F32x8 a) { return {_mm256_sqrt_ps(a.v)}; }
-// a > b ? a : b in every lane, so b where one is not a number; the other alike.
+// a > b ? a : b in every lane, so b where one is NaN; the other alike.
 N3DS_LANE_INLINE F32x8 Greater(F32x8 a, F32x8 b) { return {_mm256_max_ps(a.v, b.v)}; }
 N3DS_LANE_INLINE F32x8 Lesser(F32x8 a, F32x8 b) { return {_mm256_min_ps(a.v, b.v)}; }
 // a > b ? x : y.
